@@ -36,10 +36,12 @@ class [[nodiscard]] Result {
     bool ok() const { return held_.index() == 0; }
     explicit operator bool() const { return ok(); }
 
-    T& value() { return *std::get_if<0>(&held_); }
-    const T& value() const { return *std::get_if<0>(&held_); }
-    T& operator*() { return value(); }
-    const T& operator*() const { return value(); }
+    T& value() & { return *std::get_if<0>(&held_); }
+    const T& value() const& { return *std::get_if<0>(&held_); }
+    T value() && { return std::move(*std::get_if<0>(&held_)); }  // no view of a temporary
+    T& operator*() & { return value(); }
+    const T& operator*() const& { return value(); }
+    T operator*() && { return std::move(*this).value(); }
     T* operator->() { return &value(); }
     const T* operator->() const { return &value(); }
     const Error& error() const { return *std::get_if<1>(&held_); }

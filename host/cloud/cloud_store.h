@@ -45,7 +45,8 @@ struct CloudWrite {
 
 enum class WriteOutcome {
     kWritten,    // stored under `revision`
-    kUnchanged,  // it already was so, byte by byte; nothing was written, `revision` is the present one
+    kUnchanged,  // it already was so, byte by byte; nothing was written, `revision` is the present
+                 // one
     kConflict,   // `expected` did not hold; nothing was written, `revision` is the present one
 };
 
