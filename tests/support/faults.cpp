@@ -18,6 +18,7 @@
 #include <cstring>
 #include <mutex>
 #include <ostream>
+#include <utility>
 
 #include "common/device.h"
 
@@ -41,27 +42,38 @@ Layer& layer() {
 // Set while this file itself works, so that it does not fail itself.
 thread_local bool t_inside = false;
 
+// Holds the layer. The mutex is wrapped like any other, so its own calls must not count.
+class Lock {
+  public:
+    Lock() : was_inside_(std::exchange(t_inside, true)) { layer().mutex.lock(); }
+    ~Lock() {
+        layer().mutex.unlock();
+        t_inside = was_inside_;
+    }
+    Lock(const Lock&) = delete;
+    Lock& operator=(const Lock&) = delete;
+
+  private:
+    bool was_inside_;
+};
+
 bool hit(const char* function) {
     if (t_inside) {
         return false;
     }
-    t_inside = true;
+    const Lock lock;
+    Layer& l = layer();
     bool fails = false;
-    {
-        Layer& l = layer();
-        const std::lock_guard lock(l.mutex);
-        if (l.counting && l.fired == nullptr && (l.armed.empty() || l.armed == function)) {
-            fails = ++l.calls == l.nth;
-            l.fired = fails ? function : nullptr;
-        }
+    if (l.counting && l.fired == nullptr && (l.armed.empty() || l.armed == function)) {
+        fails = ++l.calls == l.nth;
+        l.fired = fails ? function : nullptr;
     }
-    t_inside = false;
     return fails;
 }
 
 void fail(const char* function, int nth) {
+    const Lock lock;
     Layer& l = layer();
-    const std::lock_guard lock(l.mutex);
     l.armed = function;
     l.counting = true;
     l.nth = nth;
@@ -70,29 +82,29 @@ void fail(const char* function, int nth) {
 }
 
 void clear() {
+    const Lock lock;
     Layer& l = layer();
-    const std::lock_guard lock(l.mutex);
     l.counting = false;
     l.fired = nullptr;
 }
 
 const char* fired() {
+    const Lock lock;
     Layer& l = layer();
-    const std::lock_guard lock(l.mutex);
     return l.fired;
 }
 
 int calls() {
+    const Lock lock;
     Layer& l = layer();
-    const std::lock_guard lock(l.mutex);
     return l.calls;
 }
 
 void take_log(void (*line)(const char*, const char*, const char*, void*), void* user_data) {
     std::vector<LogLine> log;
     {
+        const Lock lock;
         Layer& l = layer();
-        const std::lock_guard lock(l.mutex);
         log.swap(l.log);
     }
     for (const LogLine& entry : log) {
@@ -291,8 +303,8 @@ int __wrap___dlog_print(int log_id, int priority, const char* tag, const char* f
     int result = -1;
     if (length >= 0) {
         {
+            const Lock lock;
             Layer& l = layer();
-            const std::lock_guard lock(l.mutex);
             l.log.push_back(parse_line(line));
         }
         result = __real___dlog_print(log_id, priority, tag, "%s", line);
