@@ -9,6 +9,8 @@
 #include <cstddef>
 #include <cstdint>
 
+#include "common/owned.h"
+
 enum qor_adapters_json_value_type : int32_t {
     QOR_ADAPTERS_JSON_NONE = 0,  // a JSON null at the root, or a buffer never filled
     QOR_ADAPTERS_JSON_INT = 1,
@@ -55,3 +57,28 @@ void qor_adapters_json_parser_parse_buffer_free(qor_adapters_json_parse_buffer* 
 // Releases the text of a STRING buffer and clears its node; other types are left alone.
 void qor_adapters_json_parser_parse_buffer_free_value(qor_adapters_json_parse_buffer* buffer);
 }
+
+// Releases the value of a child, which stays where it is, at the end of the child's turn.
+using JsonValue =
+    Owned<qor_adapters_json_parse_buffer, qor_adapters_json_parser_parse_buffer_free_value>;
+
+// The text of a string value, borrowed; null for any other value.
+inline const char* json_text(const qor_adapters_json_parse_buffer& buffer) noexcept {
+    return buffer.type == QOR_ADAPTERS_JSON_STRING ? static_cast<const char*>(buffer.node)
+                                                   : nullptr;
+}
+
+// A walk over all children of a container: what get_child() gives for the indices 0, 1, 2, ..., but
+// each in constant time. Borrows the parent.
+struct JsonWalk {
+    qor_adapters_json_parse_buffer* parent;
+    int32_t next_index;
+    bool has_members;  // the parent is an object, walked with:
+    JsonObjectIter members;
+};
+
+// Begins a walk. A parent without children to give (none, or a value) ends it at its first step.
+JsonWalk walk_json_children(qor_adapters_json_parse_buffer* parent) noexcept;
+
+// Clears child (release its value before), then fills it as get_child() does and returns the same.
+int next_json_child(JsonWalk* walk, qor_adapters_json_parse_buffer* child) noexcept;
