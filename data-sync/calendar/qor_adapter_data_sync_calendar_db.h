@@ -121,3 +121,12 @@ void _qor_calendar_free_adapter_row(calendar_adapter_row* row);
 char* _qor_calendar_db_get_cloud_key_from_server(int32_t adapter_id);
 char* _qor_calendar_db_get_adapter_id_from_server(const char* cloud_key);
 }
+
+// A zero-filled row on the stack that releases what it owns.
+struct OwnedRow : calendar_adapter_row {
+    OwnedRow() noexcept : calendar_adapter_row() {}
+    ~OwnedRow() { release(); }
+    OwnedRow(const OwnedRow&) = delete;
+    OwnedRow& operator=(const OwnedRow&) = delete;
+    void release() noexcept { _qor_calendar_free_adapter_row(this); }
+};
