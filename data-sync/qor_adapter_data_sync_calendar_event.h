@@ -15,6 +15,8 @@
 #ifndef QOR_ADAPTER_DATA_SYNC_CALENDAR_EVENT_H
 #define QOR_ADAPTER_DATA_SYNC_CALENDAR_EVENT_H
 
+#pragma GCC visibility push(default) /* everything else of the library is hidden */
+
 #ifdef __cplusplus
 #define QOR_NOEXCEPT noexcept
 extern "C" {
@@ -114,5 +116,7 @@ int qor_adapter_data_sync_unset_data_changed_cb(void) QOR_NOEXCEPT;
 }
 #endif
 #undef QOR_NOEXCEPT
+
+#pragma GCC visibility pop
 
 #endif /* QOR_ADAPTER_DATA_SYNC_CALENDAR_EVENT_H */
