@@ -14,8 +14,6 @@
 
 namespace {
 
-using std::string_literals::operator""s;
-
 const char* const kTypes[] = {"NONE",   "INT",     "UINT",  "DOUBLE",
                               "STRING", "BOOLEAN", "ARRAY", "OBJECT"};
 
@@ -85,7 +83,7 @@ TEST(JsonParseBuffer, ARootHoldsItsTypeAndItsNodeOrValue) {
         {"{\"a\":", "- NONE none 0"},
         {"not JSON", "- NONE none 0"},
         {"[\"\xff\xfe\"]", "- NONE none 0"},
-        {"[\"a\0b\"]"s, "- NONE none 0"},
+        {std::string("[\"a\0b\"]", 7), "- NONE none 0"},
     };
     for (const auto& c : cases) {
         SCOPED_TRACE(c.text);
