@@ -3,7 +3,6 @@
 // The calendar app: its texts and recurrences as functions, its commands as a person runs them.
 #include <calendar_service.h>
 
-#include <chrono>
 #include <cstdlib>
 #include <fstream>
 #include <sstream>
@@ -147,6 +146,7 @@ TEST(QorCalendarRecurrence, ARangeHoldsWhatOverlapsIt) {
     }
 }
 
+// A hang ends with the time limit of every test.
 TEST(QorCalendarRecurrence, NoStoredValueMakesItHangOrCrash) {
     const std::string minutes = [] {
         std::string list = "0";
@@ -156,8 +156,6 @@ TEST(QorCalendarRecurrence, NoStoredValueMakesItHangOrCrash) {
         return list;
     }();
     const Range range = days("2014-01-01", "2014-01-02", Zone::utc());
-    const auto started = std::chrono::steady_clock::now();
-
     Event often = event_at("Etc/GMT", "1970-01-01 00:00", "0m", "FREQ=DAILY");
     often.byhour = "0,1,2,3,4,5,6,7,8,9,10,11,12,13,14,15,16,17,18,19,20,21,22,23";
     often.byminute = minutes;
@@ -187,7 +185,6 @@ TEST(QorCalendarRecurrence, NoStoredValueMakesItHangOrCrash) {
     Warnings warnings;
     EXPECT_EQ(starts_of(extreme, whole, &warnings), "20140101T000000Z");
     EXPECT_EQ(warnings, Warnings({"event 1: unknown time zone \"Mars/Base\", using UTC"}));
-    EXPECT_LT(std::chrono::steady_clock::now() - started, std::chrono::seconds(20));
 }
 
 // ---- Texts --------------------------------------------------------------------------------------
