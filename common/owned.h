@@ -27,7 +27,7 @@ template <typename T, auto Release>
 using Owned = std::unique_ptr<T, Releaser<Release>>;
 
 using Statement = Owned<sqlite3_stmt, sqlite3_finalize>;
-using Ucal = Owned<void, ucal_close>;  // UCalendar is void
+using Ucal = Owned<UCalendar, ucal_close>;
 using Parser = Owned<JsonParser, g_object_unref>;
 using Generator = Owned<JsonGenerator, g_object_unref>;
 using Object = Owned<JsonObject, json_object_unref>;
