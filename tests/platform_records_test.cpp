@@ -198,9 +198,6 @@ TEST(PlatformRecords, FiltersAreConditionsWithAnOperatorBetween) {
     EXPECT_EQ(calendar_filter_add_operator(made, CALENDAR_FILTER_OPERATOR_AND), 0);
     EXPECT_EQ(calendar_filter_add_operator(made, CALENDAR_FILTER_OPERATOR_AND), kBad) << "twice";
     EXPECT_EQ(calendar_query_set_filter(query, made), kBad) << "ends with an operator";
-    EXPECT_EQ(calendar_filter_add_int(made, _calendar_book.store_type,
-                                      static_cast<calendar_match_int_flag_e>(1), 1),
-              CALENDAR_ERROR_NOT_SUPPORTED);
     EXPECT_EQ(add(_calendar_book.store_type), 0);
     EXPECT_EQ(calendar_query_set_filter(query, made), 0);
 

@@ -38,6 +38,7 @@ constexpr char kCreate[] =
     "user_name TEXT NOT NULL UNIQUE)";
 constexpr char kSelectAll[] = "SELECT id, user_name FROM accounts ORDER BY id";
 constexpr char kSelectByName[] = "SELECT id FROM accounts WHERE user_name = ?1";
+// Ignored where another process was faster.
 constexpr char kInsert[] = "INSERT OR IGNORE INTO accounts(user_name) VALUES(?1)";
 constexpr char kDelete[] = "DELETE FROM accounts WHERE id = ?1";
 
@@ -96,25 +97,34 @@ int read_accounts(std::vector<account>* out_accounts) {
     return step == SQLITE_DONE ? ACCOUNT_ERROR_NONE : ACCOUNT_ERROR_DB_FAILED;
 }
 
+// The id of a user name; false when there is none.
+bool find_account(const Database& db, const char* user_name, int* out_account_id) {
+    const Statement select = prepare(db, kSelectByName);
+    if (!select || sqlite3_bind_text(select.get(), 1, user_name, -1, SQLITE_STATIC) != SQLITE_OK ||
+        sqlite3_step(select.get()) != SQLITE_ROW) {
+        return false;
+    }
+    *out_account_id = sqlite3_column_int(select.get(), 0);
+    return true;
+}
+
 int insert_account(const char* user_name, int* out_account_id) {
     Database db;
     const int rc = open_connected(&db);
     if (rc != ACCOUNT_ERROR_NONE) {
         return rc;
     }
-    const Statement insert = prepare(db, kInsert);
-    const Statement select = prepare(db, kSelectByName);
-    const bool done =
-        insert && select &&
-        sqlite3_bind_text(insert.get(), 1, user_name, -1, SQLITE_STATIC) == SQLITE_OK &&
-        sqlite3_step(insert.get()) == SQLITE_DONE &&
-        sqlite3_bind_text(select.get(), 1, user_name, -1, SQLITE_STATIC) == SQLITE_OK &&
-        sqlite3_step(select.get()) == SQLITE_ROW;
-    if (!done) {
-        return ACCOUNT_ERROR_DB_FAILED;
+    int id = 0;
+    if (!find_account(db, user_name, &id)) {
+        const Statement insert = prepare(db, kInsert);
+        if (!insert ||
+            sqlite3_bind_text(insert.get(), 1, user_name, -1, SQLITE_STATIC) != SQLITE_OK ||
+            sqlite3_step(insert.get()) != SQLITE_DONE || !find_account(db, user_name, &id)) {
+            return ACCOUNT_ERROR_DB_FAILED;
+        }
     }
     if (out_account_id != nullptr) {
-        *out_account_id = sqlite3_column_int(select.get(), 0);
+        *out_account_id = id;
     }
     return ACCOUNT_ERROR_NONE;
 }

@@ -1,15 +1,25 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// Failures inside the service are thrown and become result codes at the C functions, which no
-// exception leaves.
+// The border to the C functions: failures inside the service are thrown and become result codes
+// there, which no exception leaves. No state.
 #pragma once
 
+#include <cstring>
 #include <exception>
 #include <new>
 
 #include "platform/include/calendar_service.h"
 
 namespace device {
+
+// The bytes of an enumeration that a C caller gave, who can give any value.
+template <typename Enumeration>
+unsigned int raw_value(const Enumeration& value) {
+    unsigned int raw = 0;
+    static_assert(sizeof raw == sizeof value);
+    std::memcpy(&raw, &value, sizeof raw);
+    return raw;
+}
 
 struct Failure {
     calendar_error_e code;

@@ -27,8 +27,8 @@ namespace device {
 
 namespace {
 
-constexpr gint64 kQuietUs = 50 * 1000;          // changes closer together are one burst
-constexpr gint64 kLongestWaitUs = 1000 * 1000;  // of a callback, while a burst goes on
+constexpr gint64 kQuietUs = 50'000;           // changes closer together are one burst
+constexpr gint64 kLongestWaitUs = 1'000'000;  // of a callback, while a burst goes on
 constexpr gint64 kNever = -1;
 
 // The members below the GSource are set right after g_source_new(), which gives zeroed memory.

@@ -91,7 +91,7 @@ int calendar_filter_add_int(calendar_filter_h filter, unsigned int property_id,
         (!filter->conditions.empty() && filter->complete)) {
         return CALENDAR_ERROR_INVALID_PARAMETER;
     }
-    if (match != CALENDAR_MATCH_EQUAL) {
+    if (device::raw_value(match) != CALENDAR_MATCH_EQUAL) {
         return CALENDAR_ERROR_NOT_SUPPORTED;
     }
     return device::guarded([&] {
@@ -104,7 +104,7 @@ int calendar_filter_add_operator(calendar_filter_h filter, calendar_filter_opera
     if (filter == nullptr || filter->conditions.empty() || !filter->complete) {
         return CALENDAR_ERROR_INVALID_PARAMETER;
     }
-    if (op != CALENDAR_FILTER_OPERATOR_AND) {
+    if (device::raw_value(op) != CALENDAR_FILTER_OPERATOR_AND) {
         return CALENDAR_ERROR_NOT_SUPPORTED;
     }
     filter->complete = false;

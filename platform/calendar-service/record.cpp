@@ -43,11 +43,8 @@ Value* find(calendar_record_h record, unsigned int id, Type type) {
                                                                             : nullptr;
 }
 
-// Looks at the bytes, since a C caller can give an enumeration any value.
 bool has_known_type(const calendar_time_s& time) {
-    unsigned int type = 0;
-    static_assert(sizeof type == sizeof time.type);
-    std::memcpy(&type, &time.type, sizeof type);
+    const unsigned int type = device::raw_value(time.type);
     return type == CALENDAR_TIME_UTIME || type == CALENDAR_TIME_LOCALTIME;
 }
 

@@ -63,7 +63,8 @@ constexpr char kCreateSchema[] =
     "PRAGMA user_version = 1;";
 
 constexpr char kSelectOldDeleted[] =
-    "SELECT max(id) - ?1 FROM deleted_events HAVING max(id) - min(id) >= ?1";
+    "SELECT last - ?1 FROM (SELECT (SELECT max(id) FROM deleted_events) AS last, "
+    "(SELECT min(id) FROM deleted_events) AS first) WHERE last - first >= ?1";
 constexpr char kPruneDeleted[] = "DELETE FROM deleted_events WHERE id <= ?1";
 
 constexpr char kBeginRead[] = "BEGIN";
@@ -90,7 +91,7 @@ calendar_error_e error_of(int rc, int system_error) {
             return CALENDAR_ERROR_OUT_OF_MEMORY;
         case SQLITE_TOOBIG:
             return CALENDAR_ERROR_INVALID_PARAMETER;
-        case SQLITE_IOERR:
+        case SQLITE_IOERR:  // of a full disk only in part of the cases; of a used-up quota always
             return system_error == ENOSPC || system_error == EDQUOT || system_error == EFBIG
                        ? CALENDAR_ERROR_FILE_NO_SPACE
                        : CALENDAR_ERROR_DB_FAILED;
@@ -138,8 +139,8 @@ Store::Store(const std::string& path) {
     if (sqlite3_db_readonly(db, "main") != 0) {
         throw Failure{CALENDAR_ERROR_DB_FAILED};
     }
-    static_cast<void>(sqlite3_extended_result_codes(db, 0));  // fails only without a connection
-    static_cast<void>(sqlite3_busy_handler(db, wait_while_busy, nullptr));  // likewise
+    // Fails only without a connection.
+    static_cast<void>(sqlite3_busy_handler(db, wait_while_busy, nullptr));
     use_write_ahead_log();
     execute(kSyncCommits);
     create_schema();
@@ -198,6 +199,7 @@ StatementOwner Store::prepare(const std::string& sql) {
 }
 
 void Store::execute(const char* sql) {
+    errno = 0;
     const int rc = sqlite3_exec(handle(), sql, nullptr, nullptr, nullptr);
     if (rc != SQLITE_OK) {
         fail(rc);
@@ -205,7 +207,7 @@ void Store::execute(const char* sql) {
 }
 
 void Store::fail(int rc) const {
-    throw Failure{error_of(rc, handle() == nullptr ? 0 : sqlite3_system_errno(handle()))};
+    throw Failure{error_of(rc, errno)};
 }
 
 // ---- Run ----------------------------------------------------------------------------------------
@@ -251,6 +253,7 @@ Run& Run::bind(const calendar_time_s& time) {
 
 bool Run::next() {
     column_ = 0;
+    errno = 0;  // SQLite keeps no system error of a failed commit
     const int rc = sqlite3_step(statement_);
     if (rc != SQLITE_ROW && rc != SQLITE_DONE) {
         store_.fail(rc);

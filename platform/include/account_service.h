@@ -4,6 +4,8 @@
 #ifndef QOR_PLATFORM_ACCOUNT_SERVICE_H
 #define QOR_PLATFORM_ACCOUNT_SERVICE_H
 
+// NOLINTBEGIN(modernize-use-using, modernize-deprecated-headers): C reads this header too.
+
 #include <stdbool.h>
 
 #ifdef __cplusplus
@@ -42,5 +44,7 @@ int account_delete(int account_id);
 #ifdef __cplusplus
 }
 #endif
+
+// NOLINTEND(modernize-use-using, modernize-deprecated-headers)
 
 #endif  // QOR_PLATFORM_ACCOUNT_SERVICE_H

@@ -9,6 +9,8 @@
 #ifndef QOR_PLATFORM_CALENDAR_SERVICE_H
 #define QOR_PLATFORM_CALENDAR_SERVICE_H
 
+// NOLINTBEGIN(modernize-use-using, modernize-deprecated-headers): C reads this header too.
+
 #include <stdbool.h>
 #include <stdint.h>
 
@@ -306,7 +308,8 @@ int calendar_db_insert_record(calendar_record_h record, int *out_id);
 // A book or event with all its children. The caller owns it.
 int calendar_db_get_record(const char *view_uri, int id, calendar_record_h *out_record);
 
-// Writes everything that the record holds over the stored record of its id.
+// Writes everything that the record holds, its alarms included, over the stored record of its id.
+// Exceptions are left alone, but go along when their parent moves to another book.
 int calendar_db_update_record(calendar_record_h record);
 
 // Writes the record in place of the stored one, keeping the id, and keeping the book and the parent
@@ -322,8 +325,11 @@ int calendar_db_get_current_version(int *out_version);
 int calendar_db_get_last_change_version(int *out_version);
 
 // The changes of a book after a version, as _calendar_updated_info records ordered by version: one
-// per event, its latest change only, deleted events included. The caller owns the list, which may
-// be empty. out_current_version is the store's version at the same moment.
+// per event, its latest change only, deleted events included. Within one version parents come
+// before their exceptions, but deleted exceptions before their parent. An event that moved to
+// another book is listed as deleted here. The latest 100,000 deleted events stay listed; older ones
+// are dropped when a process connects. The caller owns the list, which may be empty.
+// out_current_version is the store's version at the same moment.
 int calendar_db_get_changes_by_version(const char *view_uri, int calendar_book_id, int version,
                                        calendar_list_h *out_list, int *out_current_version);
 
@@ -335,7 +341,7 @@ typedef void (*calendar_db_changed_cb)(const char *view_uri, void *user_data);
 // Subscribes to changes of a view, made by any process. The callback runs on the GLib main context
 // that is the calling thread's default at this call, once soon after subscribing and then once per
 // burst of changes. Subscribing the same callback and user data twice is an error
-// (CALENDAR_ERROR_INVALID_PARAMETER).
+// (CALENDAR_ERROR_INVALID_PARAMETER); removing what was not subscribed is CALENDAR_ERROR_NO_DATA.
 int calendar_db_add_changed_cb(const char *view_uri, calendar_db_changed_cb callback,
                                void *user_data);
 int calendar_db_remove_changed_cb(const char *view_uri, calendar_db_changed_cb callback,
@@ -344,5 +350,7 @@ int calendar_db_remove_changed_cb(const char *view_uri, calendar_db_changed_cb c
 #ifdef __cplusplus
 }
 #endif
+
+// NOLINTEND(modernize-use-using, modernize-deprecated-headers)
 
 #endif  // QOR_PLATFORM_CALENDAR_SERVICE_H

@@ -4,6 +4,8 @@
 #ifndef QOR_PLATFORM_DEVICE_LOG_H
 #define QOR_PLATFORM_DEVICE_LOG_H
 
+// NOLINTBEGIN(modernize-use-using, modernize-deprecated-headers): C reads this header too.
+
 #ifdef __cplusplus
 extern "C" {
 #endif
@@ -26,5 +28,7 @@ int __dlog_print(int log_id, int priority, const char *tag, const char *format, 
 #ifdef __cplusplus
 }
 #endif
+
+// NOLINTEND(modernize-use-using, modernize-deprecated-headers)
 
 #endif  // QOR_PLATFORM_DEVICE_LOG_H

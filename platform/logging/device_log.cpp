@@ -5,6 +5,7 @@
 #include "platform/include/device_log.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
@@ -14,6 +15,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
+#include <memory>
 #include <mutex>
 #include <new>
 #include <string>
@@ -38,10 +40,16 @@ Destination& destination() {
     return *current;
 }
 
+// False for a file that was removed since it was opened.
+bool is_still_there(int fd) {
+    struct stat status {};
+    return fstat(fd, &status) == 0 && status.st_nlink > 0;
+}
+
 // Makes the destination the one named. 0, or a negative errno value.
 int open_destination(const char* name) {
     Destination& current = destination();
-    if (current.fd >= 0 && current.name == name) {
+    if (current.fd >= 0 && current.name == name && is_still_there(current.fd)) {
         return 0;
     }
     if (current.fd > STDERR_FILENO) {
@@ -124,28 +132,6 @@ bool is_off(const char* name) {
     return name == nullptr || *name == '\0' || std::strcmp(name, "off") == 0;
 }
 
-// The length of the formatted message, or a negative code.
-__attribute__((format(printf, 3, 0))) int print(int priority, const char* tag, const char* format,
-                                                va_list arguments) {
-    const char* const name = std::getenv("QOR_LOG");
-    std::array<char, 1024> buffer{};
-    va_list again;
-    va_copy(again, arguments);
-    const int length = std::vsnprintf(buffer.data(), buffer.size(), format, arguments);
-    int rc = length < 0 ? -EINVAL : 0;
-    if (rc == 0 && !is_off(name)) {
-        std::string message(buffer.data());
-        if (static_cast<size_t>(length) >= buffer.size()) {
-            message.resize(static_cast<size_t>(length));
-            // The terminating null falls on the string's own.
-            static_cast<void>(std::vsnprintf(message.data(), message.size() + 1, format, again));
-        }
-        rc = write_line(priority, tag == nullptr ? "" : tag, message, name);
-    }
-    va_end(again);
-    return rc == 0 ? length : rc;
-}
-
 }  // namespace
 
 // One buffer serves every log id in development.
@@ -153,14 +139,23 @@ int __dlog_print(int /*log_id*/, int priority, const char* tag, const char* form
     if (format == nullptr) {
         return -EINVAL;
     }
+    char* text = nullptr;
     va_list arguments;
     va_start(arguments, format);
-    int rc = -ENOMEM;
-    try {
-        rc = print(priority, tag, format, arguments);
-    } catch (const std::bad_alloc&) {
-        rc = -ENOMEM;
-    }
+    const int length = vasprintf(&text, format, arguments);
     va_end(arguments);
-    return rc;
+    if (length < 0) {
+        return -ENOMEM;
+    }
+    const std::unique_ptr<char, decltype(&std::free)> message(text, &std::free);
+    const char* const name = std::getenv("QOR_LOG");
+    if (is_off(name)) {
+        return length;
+    }
+    try {
+        const int rc = write_line(priority, tag == nullptr ? "" : tag, message.get(), name);
+        return rc == 0 ? length : rc;
+    } catch (const std::bad_alloc&) {
+        return -ENOMEM;
+    }
 }
