@@ -62,10 +62,10 @@ class ValuesTest : public DeviceTest {
     }
     ~ValuesTest() override {
         faults()->clear();
-        adapter_.data_sync_deinitialize(0);
-        while (GSource* timer = retry_timer()) {
-            g_source_destroy(timer);
+        if (retry_timer() != nullptr) {
+            run_retry();
         }
+        adapter_.data_sync_deinitialize(0);
     }
 
     void start() {
@@ -76,8 +76,7 @@ class ValuesTest : public DeviceTest {
         EXPECT_EQ(calendar_connect(), 0);
         EXPECT_EQ(calendar_db_add_changed_cb(_calendar_event._uri, note_version, &seen_version_),
                   0);
-        book_ = std::stoi(query(QOR_DEVICE_ROOT "/opt/usr/dbspace/.calendar-service.db",
-                                "SELECT max(id) FROM book"));
+        book_ = newest_book();
     }
 
     const FaultControl* faults() const { return adapter_.faults(); }
@@ -292,7 +291,11 @@ TEST_F(ValuesTest, OccurrencesAfterTheirParentAreAppliedAtOnce) {
     EXPECT_NE(row_of(again), "");
     EXPECT_EQ(adapter_.data_sync_delete_value(parent.c_str()), 0);
     EXPECT_EQ(query(kAdapterFile, "SELECT count(*) FROM qor_event_data_table"), "0");
-    EXPECT_FALSE(told_of_changes());
+    // The service deleted the occurrence with its parent, and only the parent is noted as own: the
+    // host is told of a deletion that names no item.
+    EXPECT_TRUE(told_of_changes());
+    EXPECT_THAT(dirty(), IsEmpty());
+    EXPECT_THAT(deleted(), ElementsAre("-1"));
 }
 
 TEST_F(ValuesTest, OccurrencesBeforeTheirParentWaitForTheRetry) {
@@ -334,9 +337,10 @@ TEST_F(ValuesTest, OccurrencesBeforeTheirParentWaitForTheRetry) {
 TEST_F(ValuesTest, TheRetryAddsWithoutABlankAndClearsAListThatHasTheEntry) {
     const std::string parent = insert(weekly("Stand-up"));
     const int parent_event = event_of(parent);
+    add_cloud_key(std::stoi(parent), "parent-key");
     const auto retry_with = [&](const char* old_list, int64_t instant) {
         set_text(parent_event, _calendar_event.exdate, old_list);
-        run_sql(kHostFile, "DROP TABLE IF EXISTS datasync_table");
+        run_sql(kHostFile, "DELETE FROM datasync_table");
         const std::string id = insert(occurrence("x", "parent-key", instant, true));
         add_cloud_key(std::stoi(parent), "parent-key");
         insert(event("arms the timer"));
@@ -392,7 +396,13 @@ TEST_F(ValuesTest, AnOccurrenceWhoseParentIsGoneKeepsItsNumberOnly) {
                 changed);
     insert(event("arms the timer"));
     run_retry();
-    EXPECT_THAT(lines(), ::testing::Contains(critical(kRetryExdate, "value is null")));
+    EXPECT_THAT(lines(), ElementsAre(critical(kRetryExdate, "value is null"),
+                                     critical(kRetry, "value is null")));
+    run_sql(kAdapterFile, "UPDATE qor_event_data_table SET calsvc_id=0 WHERE adapter_id=" + parent);
+    insert(event("arms the timer"));
+    run_retry();
+    EXPECT_THAT(lines(), ElementsAre(critical(kRetryExdate, "value is null"),
+                                     critical(kRetry, "ori_svc_id <= 0")));
 }
 
 TEST_F(ValuesTest, ACancelledOccurrenceWithoutItsInstantTakesTheFailurePath) {

@@ -67,6 +67,23 @@ int DeviceTest::add_book(int account_id) {
     return insert(book);
 }
 
+int DeviceTest::newest_book() {
+    calendar_query_h new_query = nullptr;
+    EXPECT_EQ(calendar_query_create(_calendar_book._uri, &new_query), 0);
+    const Query query(new_query);
+    calendar_list_h new_list = nullptr;
+    EXPECT_EQ(calendar_db_get_records_with_query(query.get(), 0, 0, &new_list), 0);
+    const List books(new_list);
+    int newest = 0;
+    for (int more = calendar_list_first(books.get()); more == 0;
+         more = calendar_list_next(books.get())) {
+        calendar_record_h book = nullptr;
+        EXPECT_EQ(calendar_list_get_current_record_p(books.get(), &book), 0);
+        EXPECT_EQ(calendar_record_get_int(book, _calendar_book.id, &newest), 0);
+    }
+    return newest;
+}
+
 int DeviceTest::add_event(int book_id, const std::string& summary, int original_event_id) {
     const Record event = new_record(_calendar_event._uri);
     calendar_record_h e = event.get();

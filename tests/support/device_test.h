@@ -41,6 +41,7 @@ class DeviceTest : public ::testing::Test {
     static int insert(const Record& record);  // id; 0 when it failed
     static Record read(int id, const char* view_uri = _calendar_event._uri);  // null: no such one
     static int add_book(int account_id);
+    static int newest_book();  // its id
     static int add_event(int book_id, const std::string& summary, int original_event_id = 0);
     static void set_text(int event_id, unsigned int property, const char* text);
     static std::string text(const Record& record, unsigned int property);  // "(null)" when unset
