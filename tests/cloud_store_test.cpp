@@ -58,22 +58,22 @@ TEST_F(CloudStoreTest, WritesHappenOnlyWhereTheirExpectationHolds) {
     const struct {
         const char* name;
         Write write;
-        WriteOutcome outcome;
         std::int64_t revision;
+        WriteOutcome outcome;
         bool deleted;
     } steps[] = {
-        {"a deletion of nothing", {"a", "", true, kAny, ""}, kUnchanged, 0, false},
-        {"an update of nothing", {"a", event("1"), false, 1, ""}, kConflict, 0, false},
-        {"new", {"a", event("1"), false, 0, ""}, kWritten, 1, false},
-        {"new again", {"a", event("2"), false, 0, ""}, kConflict, 1, false},
-        {"the same text", {"a", event("1"), false, kAny, ""}, kUnchanged, 1, false},
-        {"another text", {"a", event("2"), false, 1, ""}, kWritten, 2, false},
-        {"from an old revision", {"a", event("3"), false, 1, ""}, kConflict, 2, false},
-        {"a deletion of an old revision", {"a", "", true, 1, ""}, kConflict, 2, false},
-        {"a deletion", {"a", "", true, 2, ""}, kWritten, 3, true},
-        {"deleted twice", {"a", "", true, kAny, ""}, kUnchanged, 3, true},
-        {"from before the deletion", {"a", event("3"), false, 2, ""}, kConflict, 3, true},
-        {"new after a deletion", {"a", event("2"), false, 0, ""}, kWritten, 4, false},
+        {"a deletion of nothing", {"a", "", true, kAny, ""}, 0, kUnchanged, false},
+        {"an update of nothing", {"a", event("1"), false, 1, ""}, 0, kConflict, false},
+        {"new", {"a", event("1"), false, 0, ""}, 1, kWritten, false},
+        {"new again", {"a", event("2"), false, 0, ""}, 1, kConflict, false},
+        {"the same text", {"a", event("1"), false, kAny, ""}, 1, kUnchanged, false},
+        {"another text", {"a", event("2"), false, 1, ""}, 2, kWritten, false},
+        {"from an old revision", {"a", event("3"), false, 1, ""}, 2, kConflict, false},
+        {"a deletion of an old revision", {"a", "", true, 1, ""}, 2, kConflict, false},
+        {"a deletion", {"a", "", true, 2, ""}, 3, kWritten, true},
+        {"deleted twice", {"a", "", true, kAny, ""}, 3, kUnchanged, true},
+        {"from before the deletion", {"a", event("3"), false, 2, ""}, 3, kConflict, true},
+        {"new after a deletion", {"a", event("2"), false, 0, ""}, 4, kWritten, false},
     };
     for (const auto& step : steps) {
         SCOPED_TRACE(step.name);
@@ -292,6 +292,7 @@ TEST_F(CloudStoreTest, DamageAndLocksAreErrorsThatStoreNothing) {
     {
         CloudStore store = open_store();
         std::vector<Write> batch;
+        batch.reserve(200);
         for (int i = 0; i < 200; ++i) {
             batch.push_back({"k" + std::to_string(i), event(std::string(200, 't')), false, {}, ""});
         }
@@ -311,7 +312,7 @@ TEST_F(CloudStoreTest, DamageAndLocksAreErrorsThatStoreNothing) {
     }
     {
         std::fstream damage(file_, std::ios::in | std::ios::out | std::ios::binary);
-        damage.seekp(3 * 4096);
+        damage.seekp(std::streamoff{3} * 4096);
         for (int i = 0; i < 10 * 4096; ++i) {
             damage.put('\x55');
         }
@@ -329,7 +330,8 @@ TEST_F(CloudStoreTest, AWriteThatTheDiskRefusesIsTakenBackWhole) {
     if (child == 0) {
         std::signal(SIGXFSZ, SIG_IGN);
         auto store = try_open();
-        const rlimit limit{64 * 1024, 64 * 1024};
+        constexpr rlim_t kSmall = 65536;
+        const rlimit limit{kSmall, kSmall};
         setrlimit(RLIMIT_FSIZE, &limit);
         const auto result =
             store->write(std::vector<Write>{{"b", event("b"), false, {}, ""},

@@ -1,0 +1,15 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// How the host's tools end.
+#pragma once
+
+namespace qor {
+
+enum class Exit {
+    kDone = 0,
+    kPartly = 1,  // done but for the items that were listed
+    kUsage = 2,   // the command line makes no sense; nothing was done
+    kFailed = 3,
+};
+
+}  // namespace qor
