@@ -1,0 +1,24 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// Finishes what an interrupted run left. Items that it had written to the device are found by their
+// numbers, which only grow, and by their documents; they are adopted instead of written twice.
+// Everything else that it had begun is marked to be done again.
+#pragma once
+
+#include "host/sync/context.h"
+
+namespace qor {
+
+// The adapter gives out numbers that it gave before: its database was lost. Everything on the
+// device is listed anew and matched with the items by what it says. To be called before anything
+// is listed, in a new session. Returns whether it was so.
+bool check_device_identity(SyncContext& context);
+
+// The calendar was emptied or replaced behind the adapter: items are missing that nobody deleted.
+// They are delivered anew. To be called after the device's changes were collected.
+void check_calendar(SyncContext& context);
+
+// To be called after the device's changes were collected.
+void recover(SyncContext& context);
+
+}  // namespace qor
