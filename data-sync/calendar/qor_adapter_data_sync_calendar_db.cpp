@@ -157,6 +157,20 @@ bool write_row(sqlite3_stmt* statement, const calendar_adapter_row* row) {
            bind_text(statement, 3, row->exdate) && sqlite3_step(statement) == SQLITE_DONE;
 }
 
+// Keeps other threads off a connection for a scope (SQLite's own mutex, which is recursive).
+class ConnectionLock {
+  public:
+    explicit ConnectionLock(sqlite3* db) : mutex_(sqlite3_db_mutex(db)) {
+        sqlite3_mutex_enter(mutex_);
+    }
+    ~ConnectionLock() { sqlite3_mutex_leave(mutex_); }
+    ConnectionLock(const ConnectionLock&) = delete;
+    ConnectionLock& operator=(const ConnectionLock&) = delete;
+
+  private:
+    sqlite3_mutex* mutex_;
+};
+
 // Gathers the rows of a query. False when a row cannot be allocated; those gathered are then lost.
 bool gather_rows(sqlite3_stmt* statement, GList** rows) {
     GList* first = nullptr;
@@ -362,12 +376,16 @@ int _qor_calendar_db_insert_adapter(calendar_adapter_row* row) {
                 sqlite3_errmsg(adapter_db));
         return kError;
     }
-    if (!write_row(statement.get(), row)) {
-        QOR_LOG(CRITICAL, "insert db fail");
-        return kError;
+    {
+        // The id queries store rows without the adapter mutex: the number must be this row's.
+        const ConnectionLock lock(adapter_db);
+        if (write_row(statement.get(), row)) {
+            row->adapter_id = static_cast<int32_t>(sqlite3_last_insert_rowid(adapter_db));
+            return 0;
+        }
     }
-    row->adapter_id = static_cast<int32_t>(sqlite3_last_insert_rowid(adapter_db));
-    return 0;
+    QOR_LOG(CRITICAL, "insert db fail");
+    return kError;
 }
 
 // Deliberate: the adapter id argument is not used; the row names itself.
