@@ -270,18 +270,18 @@ TEST_F(EventDocumentTest, UnusableArgumentsAreRefused) {
     row.record = record.get();
     calendar_adapter_row empty{};
     const struct {
+        calendar_adapter_row* row;
         const char* text;
         size_t length;
         int flags;
-        calendar_adapter_row* row;
         int result;
     } cases[] = {
-        {nullptr, text.size(), 0, &row, 4},
-        {text.c_str(), text.size(), 0, &empty, 4},
-        {text.c_str(), text.size(), 0, nullptr, 4},
-        {text.c_str(), 0, 0, &row, 4},
-        {text.c_str(), 0, 1, &row, 0},
-        {text.c_str(), SIZE_MAX, 0, &row, 0},
+        {&row, nullptr, text.size(), 0, 4},
+        {&empty, text.c_str(), text.size(), 0, 4},
+        {nullptr, text.c_str(), text.size(), 0, 4},
+        {&row, text.c_str(), 0, 0, 4},
+        {&row, text.c_str(), 0, 1, 0},
+        {&row, text.c_str(), SIZE_MAX, 0, 0},
     };
     for (const auto& c : cases) {
         PrintCapture printed;
@@ -306,9 +306,8 @@ TEST_F(EventDocumentTest, AFailedCallIsReportedAndKeepsWhatWasStored) {
         const char* function;
         int nth;
         std::string text;
-        std::vector<LogLine> logged;  // of this module
+        std::vector<LogLine> logged;  // of this module: without, the reading succeeds
         const char* stored = "";
-        int result = -1;
     } cases[] = {
         {"calendar_record_set_str", 1, event(R"("title":"x")"), set},
         {"calendar_record_set_str", 2, event(R"("title":"x","description":"y")"), set,
@@ -321,7 +320,7 @@ TEST_F(EventDocumentTest, AFailedCallIsReportedAndKeepsWhatWasStored) {
         {"calendar_record_get_caltime", 1, event(R"("dtend":"1000")"), set},
         {"calendar_record_set_caltime", 1, event(R"("dtend":"1000")"), set},
         {"calendar_record_get_caltime", 2, event(waiting), set, "start=1; has_start=1; "},
-        {"calendar_record_set_caltime", 2, event(waiting), {}, "start=1; has_start=1; ", 0},
+        {"calendar_record_set_caltime", 2, event(waiting), {}, "start=1; has_start=1; "},
         {"calendar_record_get_caltime", 2, event(R"("dtstart":"0","duration":"P1D")"), set,
          "has_start=1; "},
         {"strdup", 1, event(R"("duration":"PT1H")"), set},
@@ -342,24 +341,22 @@ TEST_F(EventDocumentTest, AFailedCallIsReportedAndKeepsWhatWasStored) {
          1,
          event(R"("original_sync_id":"parent")"),
          {},
-         "parent_key=parent; status=1; invalid=1; ",
-         0},
+         "parent_key=parent; status=1; invalid=1; "},
         {"sqlite3_prepare_v2",
          2,
          event(R"("original_sync_id":"parent")"),
          {},
-         "parent_key=parent; status=1; invalid=1; ",
-         0},
+         "parent_key=parent; status=1; invalid=1; "},
         {"strdup", 1, event(R"("original_sync_id":"unknown")"), set, "status=1; invalid=1; "},
         {"calendar_record_set_str", 1, event(instance), set, "exdate=19700101T000000Z; "},
-        {"ucal_open", 1, event(instance), {}, "", 0},
+        {"ucal_open", 1, event(instance), {}, ""},
         {"calendar_record_create", 1, alarm, {critical(kParse, "set fail")}},
         {"calendar_record_set_int",
          1,
          alarm,
          {critical(kReminder, "set fail"), critical(kParse, kReminderFail)}},
         {"calendar_record_add_child_record", 1, alarm, no_alarm},
-        {"json_parser_new", 1, alarm, {}, "", 0},
+        {"json_parser_new", 1, alarm, {}, ""},
     };
     for (const auto& c : cases) {
         SCOPED_TRACE(testing::Message() << c.function << ' ' << c.nth << ' ' << c.text);
@@ -367,7 +364,7 @@ TEST_F(EventDocumentTest, AFailedCallIsReportedAndKeepsWhatWasStored) {
         const Parsed parsed(c.text, c.function, c.nth);
         EXPECT_TRUE(faults::fired());
         faults::clear();
-        EXPECT_EQ(parsed.result, c.result);
+        EXPECT_EQ(parsed.result, c.logged.empty() ? 0 : -1);
         EXPECT_EQ(row_text(parsed.row), c.stored);
         std::vector<LogLine> logged = log();
         std::erase_if(logged, [](const LogLine& line) {
