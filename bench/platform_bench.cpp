@@ -4,11 +4,9 @@
 // what an insert costs the disk and whether that grows with the number of events, how long a read
 // and a change list take. A benchmark that misses its bound ends with an error.
 #include <benchmark/benchmark.h>
-#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
@@ -16,24 +14,8 @@
 #include <string>
 #include <vector>
 
+#include "bench/counters.h"
 #include "platform/include/calendar_service.h"
-
-namespace {
-
-std::atomic<int> sync_count = 0;
-
-}  // namespace
-
-// Every disk sync of the process comes through these, since the program's symbols go before those
-// of the C library.
-extern "C" int fdatasync(int fd) {
-    ++sync_count;
-    return static_cast<int>(syscall(SYS_fdatasync, fd));
-}
-extern "C" int fsync(int fd) {
-    ++sync_count;
-    return static_cast<int>(syscall(SYS_fsync, fd));
-}
 
 namespace {
 
@@ -119,7 +101,7 @@ void insert_book() {
 void insert_year(benchmark::State& state) {
     std::vector<double> times;
     for ([[maybe_unused]] auto _ : state) {
-        const int syncs = sync_count;
+        const Counts counts = counts_now();
         int parent = 0;
         for (int n = 0; n < kEvents; ++n) {
             const int place = n % kBlock;
@@ -131,7 +113,8 @@ void insert_year(benchmark::State& state) {
                 recurring_ids.push_back(id);
             }
         }
-        const double syncs_per_insert = static_cast<double>(sync_count - syncs) / kEvents;
+        const double syncs_per_insert =
+            static_cast<double>((counts_now() - counts).syncs) / kEvents;
         state.counters["syncs_per_insert"] = syncs_per_insert;
         require_bound(state, syncs_per_insert <= kMostSyncsPerInsert,
                       "more than one disk sync per insert");
