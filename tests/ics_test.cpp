@@ -454,6 +454,11 @@ TEST_F(IcsTest, FilesComeInManyForms) {
         {"no end of the calendar", with("END:VCALENDAR\n", ""), expected},
         {"two calendars", plain + calendar(vevent("DTSTART:20260105T083000Z", "f")), expected},
         {"ISO 8859-1", with("\xc3\xa9 \xe2\x98\x95", "\xe9"), "Caf\xc3\xa9 folded"},
+        {"control characters",
+         with("Caf",
+              "C\x01"
+              "a\rf\x7f"),
+         expected},
         {"a NUL", with("Caf", std::string("C\0af", 4)), expected},
     };
     for (const auto& c : cases) {
@@ -639,7 +644,7 @@ TEST_F(IcsTest, WhatAFileCannotSayPlainlySurvivesTheRoundTrip) {
         R"("dtstart":"1792891800000","dtend":"1792895400000")",
         R"("eventTimezone":"Mars/Olympus","dtstart":"1792891800000","dtend":"1792895400000")",
         R"("allDay":"1","eventTimezone":"Asia/Tokyo","dtstart":"1767571200000","dtend":"1767657600000")",
-        R"("title":"\"quoted\" ; , \\ \t","dtstart":"0","dtend":"1000","organizer":"Ann: & Co; x")",
+        R"("title":" \"quoted\" ; , \\\u0001 \t","dtstart":"0","dtend":"1000","organizer":"Ann: & Co; x")",
         R"("dtstart":"0","dtend":"1000","longitude":"-0500000","latitude":"-90000000")",
     };
     std::vector<CloudWrite> writes;

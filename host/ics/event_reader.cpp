@@ -17,6 +17,7 @@ namespace qor {
 namespace {
 
 constexpr std::int64_t kDayMs = 86'400'000;
+constexpr std::int64_t kMostDays = 1'000'000;  // of a duration; longer ones are this long
 
 // libical takes any digits.
 bool is_real(const icaltimetype& time) {
@@ -58,7 +59,7 @@ class Reader {
 
     template <std::optional<std::string> EventDocument::*Member>
     void text(IcsEvent& event, Property property) {
-        std::string value = plain_text(property);
+        std::string value = without_outer_blanks(plain_text(property));
         if (!value.empty()) {
             event.document.*Member = std::move(value);
         }
@@ -123,7 +124,7 @@ const Reader::Row Reader::kRows[] = {
 std::string Reader::plain_text(Property property) {
     const icalvalue* value = icalproperty_get_value(property);
     const char* text = value == nullptr ? nullptr : icalvalue_get_text(value);
-    return text == nullptr ? std::string() : std::string(text);
+    return text == nullptr ? std::string() : without_controls(text);
 }
 
 std::optional<IcsTime> Reader::time(Property property) {
@@ -226,7 +227,7 @@ void Reader::organizer(IcsEvent& event, Property property) {
         count("ORGANIZER, the address beside the name");
     }
     if (!name.empty() || !nobody) {
-        event.document.organizer = name.empty() ? address : name;
+        event.document.organizer = without_controls(name.empty() ? address : name);
     }
 }
 
@@ -297,8 +298,11 @@ void Reader::end(IcsEvent& event) {
         // Days follow the clock, hours pass (RFC 5545 3.3.6).
         const icaldurationtype length = icalproperty_get_duration(duration);
         const int sign = length.is_neg != 0 ? -1 : 1;
-        end.wall.day += sign * static_cast<int>(length.days + 7 * length.weeks);
-        exact_ms = sign * 1000LL * (length.hours * 3600LL + length.minutes * 60LL + length.seconds);
+        const std::int64_t days = length.days + std::int64_t{7} * length.weeks;
+        end.wall.day += sign * static_cast<int>(std::min(days, kMostDays));
+        exact_ms = sign * std::int64_t{1000} *
+                   (std::int64_t{3600} * length.hours + std::int64_t{60} * length.minutes +
+                    length.seconds);
     }
     if (!start.is_date) {
         all_day_marker(event, end);

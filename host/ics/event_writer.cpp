@@ -30,17 +30,6 @@ std::int64_t seconds(std::int64_t ms) {
     return ms / 1000 - (ms % 1000 < 0 ? 1 : 0);
 }
 
-// Texts come from devices too; what no file may hold is left out.
-std::string clean(const std::string& text) {
-    std::string result;
-    for (const char c : text) {
-        if (static_cast<unsigned char>(c) >= ' ' || c == '\n' || c == '\t') {
-            result += c;
-        }
-    }
-    return result;
-}
-
 class Writer {
   public:
     Writer(const EventToWrite& event, std::set<std::string>& zones, IcsReport& report)
@@ -157,7 +146,7 @@ void Writer::add_place() {
 }
 
 void Writer::add_organizer() {
-    std::string name = clean(document_.organizer.value_or(""));
+    std::string name = without_controls(document_.organizer.value_or(""));
     if (name.empty()) {
         return;
     }
@@ -213,7 +202,7 @@ IcalComponent Writer::write() {
     };
     for (const auto& [text, make] : texts) {
         if (text && !text->empty()) {
-            add(make(clean(*text).c_str()));
+            add(make(without_controls(*text).c_str()));
         }
     }
     add_place();

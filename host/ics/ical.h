@@ -5,6 +5,7 @@
 
 #include <libical/ical.h>
 
+#include <algorithm>
 #include <memory>
 #include <string>
 
@@ -30,6 +31,21 @@ inline std::string value_text(const icalproperty* property) {
 inline std::string name_text(const icalproperty* property) {
     const IcalText text(icalproperty_get_property_name_r(property));
     return text ? std::string(text.get()) : std::string();
+}
+
+// A text without the characters that no .ics file may hold (RFC 5545 3.1), whoever wrote it.
+inline std::string without_controls(std::string text) {
+    std::erase_if(text, [](char c) {
+        return (static_cast<unsigned char>(c) < ' ' && c != '\n' && c != '\t') || c == '\x7f';
+    });
+    return text;
+}
+
+// A text without blanks around it, which files do not keep.
+inline std::string without_outer_blanks(std::string text) {
+    text.erase(text.find_last_not_of(" \t\n") + 1);
+    text.erase(0, std::min(text.find_first_not_of(" \t\n"), text.size()));
+    return text;
 }
 
 // Broken input is told by results, not by aborting; unknown names are kept, not refused.

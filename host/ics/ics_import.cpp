@@ -77,7 +77,7 @@ std::string plain_rule(const std::string& rule) {
 }
 
 // Whether two documents say the same of an event. Devices order keys differently, and word the
-// cancellation of an occurrence at greater length.
+// cancellation of an occurrence at greater length; files do not keep blanks around a text.
 bool same_event(const std::string& a, const std::string& b) {
     auto first = EventDocument::parse(a);
     auto second = EventDocument::parse(b);
@@ -92,12 +92,10 @@ bool same_event(const std::string& a, const std::string& b) {
             document->rule = plain_rule(*document->rule);
         }
         std::ranges::sort(document->reminders);
-        // Files do not keep blanks at the end of a text, nor tell an empty text from none.
+        // A file cannot tell an empty text from none.
         for (auto* text : {&document->title, &document->location, &document->description}) {
-            if (*text) {
-                (*text)->erase((*text)->find_last_not_of(" \t\n") + 1);
-                *text = (*text)->empty() ? std::nullopt : *text;
-            }
+            std::string kept = without_outer_blanks(without_controls(text->value_or("")));
+            *text = kept.empty() ? std::nullopt : std::optional(std::move(kept));
         }
     }
     return *first == *second;
