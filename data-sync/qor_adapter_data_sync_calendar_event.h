@@ -26,7 +26,7 @@ extern "C" {
 
 /* The host's callback: something on the device has changed and is worth a sync. Runs on the main
  * loop on which the subscription was made, without the adapter's lock held. */
-typedef void (*data_changed_callback)(void *user_data);
+typedef void (*data_changed_callback)(void *user_data); /* NOLINT(modernize-use-using): also C */
 
 /* ---- Identity: a new text through the argument (null when memory ran out); always 0 -------------
  */

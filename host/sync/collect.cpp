@@ -61,6 +61,12 @@ class Collected {
                 unnamed_ = true;  // an item that was never told to anybody, or is told once more
             }
         }
+        if (!deleted_.empty()) {
+            // A changed occurrence that is deleted hides its own cancellation until it is forgotten:
+            // both have the series and the date, by which the adapter knows an occurrence.
+            const std::vector<int> uncovered = list_dirty(context_.device);
+            dirty_.insert(dirty_.end(), uncovered.begin(), uncovered.end());
+        }
         if (unnamed_ && expects_more()) {
             missing_ = missing_items(context_);
         }
