@@ -200,7 +200,8 @@ constexpr int kNoKey = -1;
 
 int find_key(const char* name) {
     for (int key = 0; name != nullptr && key < kEventKeyCount; ++key) {
-        if (std::strcmp(name, kEventKeys[key]) == 0) {
+        const char* const known = kEventKeys[key];
+        if (name[0] == known[0] && std::strcmp(name, known) == 0) {  // most differ at once
             return key;
         }
     }
