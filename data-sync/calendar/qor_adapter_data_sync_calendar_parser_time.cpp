@@ -15,6 +15,7 @@
 #include <limits>
 
 #include "common/log.h"
+#include "common/number.h"
 #include "common/owned.h"
 #include "common/result.h"
 #include "data-sync/calendar/qor_adapter_data_sync_calendar_parser.h"
@@ -44,15 +45,6 @@ T add_clamped(T a, T b) {
         return b < 0 ? std::numeric_limits<T>::min() : std::numeric_limits<T>::max();
     }
     return sum;
-}
-
-// Truncates toward zero, stopping at the limits.
-int64_t to_int64(double value) {
-    constexpr double kLimit = 9223372036854775808.0;  // 2^63, the first that does not fit
-    if (value >= kLimit) {
-        return std::numeric_limits<int64_t>::max();
-    }
-    return value > -kLimit ? static_cast<int64_t>(value) : std::numeric_limits<int64_t>::min();
 }
 
 double to_ms(int64_t seconds) {
