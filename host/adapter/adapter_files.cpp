@@ -20,7 +20,8 @@ std::optional<Connection> open_adapter_database() {
     if (std::filesystem::file_size(kAdapterDatabase, error) == 0 || error) {
         return std::nullopt;
     }
-    return Connection(kAdapterDatabase, Connection::Mode::kReadOnly);
+    // Not opened read only: after a kill whoever reads first takes the unfinished write back.
+    return Connection(kAdapterDatabase, Connection::Mode::kReadWrite);
 }
 
 std::optional<std::int64_t> read_number(const char* sql) {
@@ -36,6 +37,13 @@ std::optional<std::int64_t> highest_adapter_id() {
 
 std::optional<std::int64_t> adapter_baseline() {
     return read_number("SELECT version FROM version_table");
+}
+
+bool has_row(int id) {
+    std::optional<Connection> database = open_adapter_database();
+    return !database ||
+           database->number("SELECT count(*) FROM qor_event_data_table WHERE adapter_id = ?", id) !=
+               0;
 }
 
 std::vector<PendingRow> pending_rows() {

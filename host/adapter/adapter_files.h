@@ -19,6 +19,9 @@ struct PendingRow {
 // The highest item number ever given out.
 std::optional<std::int64_t> highest_adapter_id();
 
+// Whether the adapter has a row for an item; true where that cannot be told.
+bool has_row(int id);
+
 // The change version up to which the adapter has handed out changes.
 std::optional<std::int64_t> adapter_baseline();
 

@@ -54,13 +54,17 @@ gboolean expire(gpointer expired) {
 }  // namespace
 
 AdapterSession::AdapterSession(const AdapterLibrary& library, int account_id, bool sign_in)
-    : library_(library) {
-    const int rc = library_.call.initialize(account_id, sign_in ? 1 : 0);
+    : library_(library), account_id_(account_id) {
+    initialize(sign_in);
+}
+
+void AdapterSession::initialize(bool sign_in) {
+    const int rc = library_.call.initialize(account_id_, sign_in ? 1 : 0);
     if (rc != 0) {
         throw Failure(fmt::format(
             "the adapter could not be initialised for account {} (result {}); its log says why: "
             "set QOR_LOG=stderr and try again",
-            account_id, rc));
+            account_id_, rc));
     }
     initialized_ = true;
 }
@@ -158,6 +162,16 @@ void AdapterSession::clear_deleted_ids() {
         throw Failure(fmt::format("the adapter could not advance its baseline (result {})", rc));
     }
     changed_ = false;
+}
+
+void AdapterSession::forget_everything() {
+    settle();
+    clear_deleted_ids();
+    unsubscribe();
+    initialized_ = false;
+    library_.call.deinitialize(0);  // fails only when not initialised
+    initialize(false);
+    clear_deleted_ids();
 }
 
 ItemValue AdapterSession::get(int id) const {

@@ -46,6 +46,11 @@ class AdapterSession {
     std::vector<int> deleted_ids();
     void clear_deleted_ids();
 
+    // Makes the adapter list everything that is in the calendar, its own writes included: it forgets
+    // which writes were its own, and its baseline becomes 0, as it does when a new session advances
+    // it before anything was notified.
+    void forget_everything();
+
     ItemValue get(int id) const;
     // The new item's number; 0 when the adapter could store none, -1 when it refused the document.
     int insert(const std::string& document) const;
@@ -54,10 +59,12 @@ class AdapterSession {
 
   private:
     static void on_changed(void* session);
+    void initialize(bool sign_in);
     std::vector<int> ids(decltype(AdapterFunctions::get_dirty_ids) list, const char* what);
     void unsubscribe();
 
     const AdapterLibrary& library_;
+    const int account_id_;
     std::function<void()> listener_;
     bool subscribed_ = false;
     bool initialized_ = false;

@@ -9,6 +9,7 @@
 #include <unordered_map>
 #include <utility>
 
+#include "host/adapter/adapter_files.h"
 #include "host/cloud/cloud_keys.h"
 #include "host/failure.h"
 
@@ -44,7 +45,13 @@ class Reader {
         batch.commit();
         WriteBatch second(context_.database.connection());
         for (const DeviceChange& change : later) {
-            if (!read_present(change)) {
+            if (read_present(change)) {
+                continue;
+            }
+            if (!has_row(change.id) && !context_.items.by_id(change.id)) {
+                context_.journal.drop_change(
+                    change.id);  // went with its series since it was listed
+            } else {
                 put_aside(change, kUnreadable);
             }
         }

@@ -4,7 +4,6 @@
 #include "host/sync/engine.h"
 
 #include <fmt/format.h>
-#include <qor_platform.h>
 
 #include "host/failure.h"
 #include "host/sync/collect.h"
@@ -12,6 +11,7 @@
 #include "host/sync/plan.h"
 #include "host/sync/push.h"
 #include "host/sync/recover.h"
+#include "host/sync/versions.h"
 
 namespace qor {
 
@@ -159,15 +159,6 @@ bool run_round(SyncContext& context) {
 
 }  // namespace
 
-int calendar_version() {
-    int version = 0;
-    const int rc = calendar_db_get_current_version(&version);
-    if (rc != CALENDAR_ERROR_NONE) {
-        throw Failure(fmt::format("the calendar service does not answer (result {})", rc));
-    }
-    return version;
-}
-
 bool nothing_to_do(CloudStore& cloud, HostDatabase& database, int calendar_version) {
     return database.number(setting::kDeviceVersion) == calendar_version &&
            need(cloud.revision()) == database.number(setting::kCloudRevision) &&
@@ -177,6 +168,7 @@ bool nothing_to_do(CloudStore& cloud, HostDatabase& database, int calendar_versi
 void run_sync(SyncContext& context) {
     check_cloud_identity(context);
     check_device_identity(context);
+    uncover_unfinished(context);
     for (int round = 0; round < kMostRounds; ++round) {
         if (!run_round(context)) {
             return;

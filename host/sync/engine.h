@@ -6,6 +6,7 @@
 #pragma once
 
 #include "host/sync/context.h"
+#include "host/sync/versions.h"
 
 namespace qor {
 
@@ -18,8 +19,5 @@ void run_sync(SyncContext& context);
 // Forgets what was agreed with the cloud: everything on both sides is compared anew, and what only
 // one side has goes to the other.
 void start_over(HostDatabase& database);
-
-// The calendar service's current version; throws Failure.
-int calendar_version();
 
 }  // namespace qor

@@ -5,6 +5,7 @@
 
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <map>
 #include <set>
 #include <utility>
@@ -12,10 +13,14 @@
 
 #include "host/adapter/adapter_files.h"
 #include "host/sync/collect.h"
+#include "host/sync/versions.h"
 
 namespace qor {
 
 namespace {
+
+// The highest number that an interrupted batch has given out; what is listed later has higher ones.
+constexpr const char* kLastMade = "last made";
 
 struct Unfinished {
     Intent intent;
@@ -31,7 +36,7 @@ struct Found {
     int id = 0;
     SyncedDocument document;
     std::string text;
-    bool adopted = false;
+    const Unfinished* adopted = nullptr;  // whose it is
 };
 
 // Items that the batch may have made, as far as nobody knows them yet.
@@ -79,16 +84,36 @@ void adopt(SyncContext& context, Unfinished& unfinished, Found& found) {
     item.pending = false;
     context.items.store(item);
     unfinished.adopted = true;
-    found.adopted = true;
+    found.adopted = &unfinished;
 }
 
-bool same_kind(const SyncedDocument& written, const SyncedDocument& found) {
-    return (written.kind() == ItemKind::kCancelled) == (found.kind() == ItemKind::kCancelled);
+// A cancellation is what it says; an event may have been edited since it was written.
+bool may_have_been_edited(const SyncedDocument& written, const SyncedDocument& found) {
+    return written.kind() != ItemKind::kCancelled && found.kind() != ItemKind::kCancelled;
 }
 
-// First by what they say, then by the order in which numbers are given out.
+// Whether the items were made in the order of the intents, as far as they can be told by what they
+// say; an insert that failed leaves no number behind.
+bool in_order(const std::map<int, Unfinished*>& by_order, const std::vector<Found>& made,
+              int last_made) {
+    return std::ranges::all_of(made, [&](const Found& found) {
+        const auto candidate = by_order.find(found.id);
+        return found.id > last_made || found.adopted == nullptr ||
+               (candidate != by_order.end() && candidate->second == found.adopted);
+    });
+}
+
+// First by what they say. What was made and then edited is found by the order in which numbers are
+// given out: it has no match, and a number that the batch gave out.
 void match(SyncContext& context, std::vector<Unfinished>& unfinished, std::vector<Found>& made,
            int base_id) {
+    std::map<int, Unfinished*> by_order;
+    int next_id = base_id;
+    for (Unfinished& candidate : unfinished) {
+        if (candidate.makes_item()) {
+            by_order[++next_id] = &candidate;
+        }
+    }
     for (Found& found : made) {
         for (Unfinished& candidate : unfinished) {
             if (!candidate.adopted && candidate.makes_item() &&
@@ -98,17 +123,15 @@ void match(SyncContext& context, std::vector<Unfinished>& unfinished, std::vecto
             }
         }
     }
-    std::map<int, Unfinished*> by_order;
-    int next_id = base_id;
-    for (Unfinished& candidate : unfinished) {
-        if (candidate.makes_item()) {
-            by_order[++next_id] = &candidate;
-        }
+    const int last_made = static_cast<int>(context.database.number(kLastMade));
+    if (!in_order(by_order, made, last_made)) {
+        return;
     }
     for (Found& found : made) {
         const auto candidate = by_order.find(found.id);
-        if (!found.adopted && candidate != by_order.end() && !candidate->second->adopted &&
-            same_kind(*candidate->second->document, found.document)) {
+        if (found.adopted == nullptr && found.id <= last_made && candidate != by_order.end() &&
+            !candidate->second->adopted &&
+            may_have_been_edited(*candidate->second->document, found.document)) {
             adopt(context, *candidate->second, found);
         }
     }
@@ -116,20 +139,32 @@ void match(SyncContext& context, std::vector<Unfinished>& unfinished, std::vecto
 
 }  // namespace
 
-bool check_device_identity(SyncContext& context) {
+void check_device_identity(SyncContext& context) {
     const std::optional<std::int64_t> given = highest_adapter_id();
     if (!given || *given >= context.database.number(setting::kHighestId)) {
-        return false;
+        return;
     }
     WriteBatch batch(context.database.connection());
     context.database.connection().script("DELETE FROM device_change; DELETE FROM alias");
     context.database.set(setting::kHighestId, *given);
     context.items.each([&](const Item& item) { mark_absent(context, item); });
     batch.commit();
-    context.device.clear_deleted_ids();  // first call of all: the baseline becomes 0
+    context.device.forget_everything();
     context.report.add(What::kNote, "the adapter's records", "",
                        "they were lost; the calendar is matched with the cloud again");
-    return true;
+}
+
+void uncover_unfinished(SyncContext& context) {
+    if (context.journal.intents().empty()) {
+        return;
+    }
+    if (context.database.number(kLastMade) == 0) {
+        WriteBatch batch(context.database.connection());
+        context.database.set(kLastMade, highest_adapter_id().value_or(0));
+        batch.commit();
+    }
+    collect_device_changes(context, calendar_version());
+    context.device.forget_everything();
 }
 
 void check_calendar(SyncContext& context) {
@@ -184,6 +219,7 @@ void recover(SyncContext& context) {
         }
     }
     context.journal.drop_intents();
+    context.database.set(kLastMade, std::int64_t{0});
     batch.commit();
 }
 

@@ -11,8 +11,12 @@ namespace qor {
 
 // The adapter gives out numbers that it gave before: its database was lost. Everything on the
 // device is listed anew and matched with the items by what it says. To be called before anything
-// is listed, in a new session. Returns whether it was so.
-bool check_device_identity(SyncContext& context);
+// is listed.
+void check_device_identity(SyncContext& context);
+
+// After an interrupted batch the adapter may hold an event for its own write that it has no item
+// for, and so never tell of it. Makes it list everything. To be called before anything is listed.
+void uncover_unfinished(SyncContext& context);
 
 // The calendar was emptied or replaced behind the adapter: items are missing that nobody deleted.
 // They are delivered anew. To be called after the device's changes were collected.

@@ -166,6 +166,11 @@ class Completion {
                 text = upload.deleted ? std::string() : upload.text;
             }
         }
+        for (const KeyChange& adopted : plan_.adopted) {  // and in the cloud by an interrupted run
+            if (adopted.key == child.key && adopted.cloud_event) {
+                text = adopted.cloud_document.text;
+            }
+        }
         if (auto document = SyncedDocument::parse(text)) {
             add(delivery_of(std::move(change), std::move(*document), text, child.revision));
         }
