@@ -67,7 +67,7 @@ TEST_F(ConcurrencyTest, WorkersAndTheMainLoopShareOneAdapter) {
     const int book = newest_book();
     std::thread first([this] { work(1); });
     std::thread second([this] { work(2); });
-    const gint64 end = g_get_monotonic_time() + 3 * G_USEC_PER_SEC;
+    const gint64 end = g_get_monotonic_time() + gint64{3} * G_USEC_PER_SEC;
     for (int edits = 0; g_get_monotonic_time() < end || told_ == 0; ++edits) {
         if (edits % 50 == 0) {
             add_event(book, "Edited on the device");

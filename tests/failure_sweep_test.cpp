@@ -69,7 +69,7 @@ class FailureSweepTest : public DeviceTest, public ::testing::WithParamInterface
     std::string insert(const char* document) {
         char* id = nullptr;
         expect_code(adapter_.data_sync_insert_value(nullptr, document, &id));
-        const std::string text = id != nullptr ? id : "0";
+        std::string text = id != nullptr ? id : "0";
         free(id);
         return text;
     }
@@ -79,7 +79,7 @@ class FailureSweepTest : public DeviceTest, public ::testing::WithParamInterface
         const int result = adapter_.data_sync_get_value(id.c_str(), "sweep", &document);
         EXPECT_GE(result, 0);
         EXPECT_EQ(result == 0, document != nullptr);
-        const std::string text = document != nullptr ? document : "";
+        std::string text = document != nullptr ? document : "";
         free(document);
         return text;
     }

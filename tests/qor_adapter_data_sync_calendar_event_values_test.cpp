@@ -85,20 +85,20 @@ class ValuesTest : public DeviceTest {
     std::string insert(const std::string& document) {
         char* id = nullptr;
         EXPECT_EQ(adapter_.data_sync_insert_value(nullptr, document.c_str(), &id), 0);
-        const std::string text = id != nullptr ? id : "(none)";
+        std::string text = id != nullptr ? id : "(none)";
         free(id);
         return text;
     }
     // Inserts an item that the host then knows by a cloud key.
     std::string insert(const std::string& document, const std::string& cloud_key) {
-        const std::string id = insert(document);
+        std::string id = insert(document);
         add_cloud_key(std::stoi(id), cloud_key);
         return id;
     }
     Json get(const std::string& id) {
         char* text = nullptr;
         EXPECT_EQ(adapter_.data_sync_get_value(id.c_str(), "log", &text), 0) << id;
-        const Json document = text != nullptr ? Json::parse(text) : Json();
+        Json document = text != nullptr ? Json::parse(text) : Json();
         free(text);
         return document;
     }
@@ -308,8 +308,8 @@ TEST_F(ValuesTest, OccurrencesBeforeTheirParentWaitForTheRetry) {
     GSource* const first = retry_timer();
     ASSERT_NE(first, nullptr);
     const gint64 due = g_source_get_ready_time(first) - g_get_monotonic_time();
-    EXPECT_GT(due, 58 * G_USEC_PER_SEC);
-    EXPECT_LE(due, 61 * G_USEC_PER_SEC);
+    EXPECT_GT(due, gint64{58} * G_USEC_PER_SEC);
+    EXPECT_LE(due, gint64{61} * G_USEC_PER_SEC);
     lines();
     run_retry();  // the host does not know the parent's key yet
     EXPECT_THAT(lines(), ElementsAre(critical(kRetryExdate, "get svc_id fail!")));
