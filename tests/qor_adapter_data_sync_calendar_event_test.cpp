@@ -10,7 +10,6 @@
 namespace {
 
 using ::testing::ElementsAre;
-using ::testing::IsEmpty;
 
 constexpr char kInit[] = "qor_adapter_data_sync_initialize";
 constexpr char kDeinit[] = "qor_adapter_data_sync_deinitialize";
