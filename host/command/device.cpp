@@ -78,7 +78,7 @@ Device::~Device() {
 }
 
 void Device::lock() {
-    constexpr int kTries = 100;
+    constexpr int kTries = 20;
     constexpr useconds_t kPauseUs = 50000;
     lock_ = open(kLockFile, O_RDWR | O_CREAT | O_CLOEXEC, 0644);
     if (lock_ < 0) {

@@ -60,7 +60,7 @@ void sync_options(CLI::App& app, Arguments& a) {
     app.add_flag("--dry-run", a.dry_run, "Tell what would be done; change no event anywhere");
     policy_option(app, a);
     app.add_flag("--wait-pending", a.wait_pending,
-                 "Wait up to a minute for the adapter to try pending occurrences once more");
+                 "Wait up to a minute for the adapter's next try of pending occurrences");
     app.add_flag("--start-over", a.start_over,
                  "Compare everything anew, after the cloud was replaced or restored");
 }

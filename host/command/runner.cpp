@@ -70,7 +70,11 @@ bool idle(Device& device, CloudStore& cloud) {
     if (calendar_connect() != CALENDAR_ERROR_NONE) {
         throw Failure("the calendar service does not answer; is the device directory writable?");
     }
-    return nothing_to_do(cloud, device.database(), calendar_version());
+    const bool idle = nothing_to_do(cloud, device.database(), calendar_version());
+    if (idle) {
+        static_cast<void>(calendar_disconnect());  // an adapter would connect once more
+    }
+    return idle;
 }
 
 Outcome run_logged(Device& device, CloudStore& cloud, AdapterSession& session,

@@ -4,9 +4,8 @@
 #include <fmt/format.h>
 #include <glib.h>
 
-#include <algorithm>
-
 #include "host/adapter/adapter_files.h"
+#include "host/cli/terminal.h"
 #include "host/command/command.h"
 #include "host/command/output.h"
 #include "host/command/runner.h"
@@ -19,11 +18,21 @@ namespace {
 
 constexpr guint kRetrySeconds = 61;  // adapters try pending occurrences 60 seconds after an insert
 
-// Rows that a later write may bring to life; a failed write waits for nothing.
-std::size_t waiting_rows() {
-    const std::vector<PendingRow> rows = pending_rows();
-    return static_cast<std::size_t>(std::count_if(
-        rows.begin(), rows.end(), [](const PendingRow& row) { return !row.parent_key.empty(); }));
+struct Waiting {
+    std::size_t all = 0;
+    std::size_t ready = 0;  // their series is on the device: the adapter's next try applies them
+};
+
+// A failed write is pending, too, but waits for nothing.
+Waiting waiting_rows(HostDatabase& database) {
+    Waiting waiting;
+    Items items(database.connection());
+    for (const PendingRow& row : pending_rows()) {
+        const std::optional<Item> parent = items.by_key(row.parent_key);
+        waiting.all += row.parent_key.empty() ? 0 : 1;
+        waiting.ready += parent && parent->id > 0 && !parent->pending ? 1 : 0;
+    }
+    return waiting;
 }
 
 gboolean expire(gpointer expired) {
@@ -31,25 +40,27 @@ gboolean expire(gpointer expired) {
     return G_SOURCE_REMOVE;
 }
 
-// Returns whether the adapter has applied any.
-bool wait_for_pending(std::size_t before) {
+void wait_for_pending(HostDatabase& database) {
     bool expired = false;
     const guint timer = g_timeout_add_seconds(kRetrySeconds, expire, &expired);
-    while (!expired && waiting_rows() == before) {
+    while (!expired && waiting_rows(database).ready > 0) {
         g_main_context_iteration(nullptr, TRUE);
     }
     if (!expired) {
         g_source_remove(timer);
     }
-    return waiting_rows() != before;
 }
 
-void tell_pending(std::size_t waiting) {
-    if (waiting > 0) {
+void tell_pending(const Waiting& waiting) {
+    if (waiting.all > waiting.ready) {
+        fmt::print("{} waiting for their series, which is not in the cloud yet\n",
+                   plural(waiting.all - waiting.ready, "occurrence"));
+    }
+    if (waiting.ready > 0) {
         fmt::print(
-            "{} occurrences wait for their series, which is not in the cloud yet; --wait-"
-            "pending waits for the adapter's next try\n",
-            waiting);
+            "{} waiting for the adapter's next try, a minute after its latest insert: "
+            "sync --wait-pending waits for it\n",
+            plural(waiting.ready, "occurrence"));
     }
 }
 
@@ -58,8 +69,8 @@ Outcome sync_once(Device& device, CloudStore& cloud, const Arguments& arguments)
     AdapterSession session(library, device.account_id(), false);
     const SyncOptions options = sync_options(arguments);
     Outcome outcome = run_logged(device, cloud, session, options, "sync");
-    const std::size_t waiting = waiting_rows();
-    if (arguments.wait_pending && waiting > 0 && !options.dry_run && wait_for_pending(waiting)) {
+    if (arguments.wait_pending && !options.dry_run && waiting_rows(device.database()).ready > 0) {
+        wait_for_pending(device.database());
         const Outcome again = run_logged(device, cloud, session, options, "sync");
         outcome.report.entries.insert(outcome.report.entries.end(), again.report.entries.begin(),
                                       again.report.entries.end());
@@ -90,7 +101,7 @@ Exit sync(const Arguments& arguments) {
         print_json(report_json(outcome.report, outcome.duration_ms));
     } else {
         print_report(outcome.report, outcome.duration_ms);
-        tell_pending(waiting_rows());
+        tell_pending(waiting_rows(device.database()));
     }
     return outcome.status();
 }

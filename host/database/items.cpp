@@ -22,6 +22,8 @@ constexpr const char* kByParent = "SELECT " QOR_ITEM_COLUMNS
                                   "ORDER BY rowid";
 constexpr const char* kAbsent =
     "SELECT " QOR_ITEM_COLUMNS " FROM datasync_table WHERE adapter_id IS NULL ORDER BY rowid";
+constexpr const char* kPending =
+    "SELECT " QOR_ITEM_COLUMNS " FROM datasync_table WHERE pending = 1 ORDER BY rowid";
 constexpr const char* kAll = "SELECT " QOR_ITEM_COLUMNS " FROM datasync_table ORDER BY rowid";
 constexpr const char* kFirst =
     "SELECT " QOR_ITEM_COLUMNS
@@ -81,6 +83,10 @@ std::vector<Item> Items::children(std::string_view parent_key) {
 
 std::vector<Item> Items::absent() {
     return read_all(connection_.query(kAbsent));
+}
+
+std::vector<Item> Items::pending() {
+    return read_all(connection_.query(kPending));
 }
 
 void Items::each(const std::function<void(const Item&)>& visit) {

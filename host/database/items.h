@@ -34,7 +34,8 @@ class Items {
     std::optional<Item> by_key(std::string_view key);
     std::optional<Item> by_id(int id);
     std::vector<Item> children(std::string_view parent_key);
-    std::vector<Item> absent();  // wanted on the device, but not there
+    std::vector<Item> absent();   // wanted on the device, but not there
+    std::vector<Item> pending();  // held back by the adapter
     void each(const std::function<void(const Item&)>& visit);
     std::optional<Item> first_on_device();
 

@@ -62,8 +62,9 @@ class Collected {
             }
         }
         if (!deleted_.empty()) {
-            // A changed occurrence that is deleted hides its own cancellation until it is forgotten:
-            // both have the series and the date, by which the adapter knows an occurrence.
+            // A changed occurrence that is deleted hides its own cancellation until it is
+            // forgotten: both have the series and the date, by which the adapter knows an
+            // occurrence.
             const std::vector<int> uncovered = list_dirty(context_.device);
             dirty_.insert(dirty_.end(), uncovered.begin(), uncovered.end());
         }

@@ -140,6 +140,7 @@ bool run_round(SyncContext& context) {
     collect_device_changes(context, device_version);
     check_calendar(context);
     recover(context);
+    note_applied(context);
     const Plan plan = make_plan(context);
     if (!context.options.allow_mass_delete && too_many_deletions(context, plan)) {
         return false;

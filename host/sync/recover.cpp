@@ -194,6 +194,26 @@ void check_calendar(SyncContext& context) {
                        "the device lost them without deleting them; they are delivered again");
 }
 
+void note_applied(SyncContext& context) {
+    std::vector<Item> applied;
+    for (Item& item : context.items.pending()) {
+        ItemValue value = context.device.get(item.id);
+        if (value.state == ItemValue::State::kRead) {
+            item.pending = false;
+            item.device_document = std::move(value.document);
+            applied.push_back(std::move(item));
+        }
+    }
+    if (applied.empty()) {
+        return;
+    }
+    WriteBatch batch(context.database.connection());
+    for (const Item& item : applied) {
+        context.items.store(item);
+    }
+    batch.commit();
+}
+
 void recover(SyncContext& context) {
     std::vector<Unfinished> unfinished;
     for (Intent& intent : context.journal.intents()) {

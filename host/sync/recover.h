@@ -22,6 +22,9 @@ void uncover_unfinished(SyncContext& context);
 // They are delivered anew. To be called after the device's changes were collected.
 void check_calendar(SyncContext& context);
 
+// Pending occurrences that the adapter has applied by itself meanwhile are items like all others.
+void note_applied(SyncContext& context);
+
 // To be called after the device's changes were collected.
 void recover(SyncContext& context);
 
