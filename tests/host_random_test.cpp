@@ -20,6 +20,7 @@ constexpr unsigned int kSeed = 20260105;
 constexpr int kSteps = 150;
 constexpr long long kMonday = 1767625200;  // 2026-01-05 15:00 UTC
 constexpr long long kWeek = 604800;
+constexpr long long kHour = 3600;
 
 class HostRandomTest : public HostTest {
   protected:
@@ -32,7 +33,7 @@ class HostRandomTest : public HostTest {
     NewEvent new_event() {
         NewEvent event;
         event.title = new_title();
-        event.start_s = kMonday + pick(50) * 3600;
+        event.start_s = kMonday + pick(50) * kHour;
         event.frequency = pick(3) == 0 ? CALENDAR_RECURRENCE_WEEKLY : 0;
         event.count = event.frequency == 0 ? 0 : 10;
         if (pick(3) == 0) {
@@ -80,7 +81,7 @@ class HostRandomTest : public HostTest {
             } else {
                 NewEvent moved;
                 moved.title = new_title();
-                moved.start_s = kMonday + kWeek + pick(50) * 3600;
+                moved.start_s = kMonday + kWeek + pick(50) * kHour;
                 on.move_occurrence(event, instant, moved);
             }
         }
@@ -93,8 +94,8 @@ class HostRandomTest : public HostTest {
             untouched_.insert(title);
             put("cloud-" + std::to_string(titles_),
                 document({{"title", title},
-                          {"dtstart", std::to_string((kMonday + pick(50) * 3600) * 1000)},
-                          {"dtend", std::to_string((kMonday + 60 * 3600) * 1000)}}));
+                          {"dtstart", std::to_string((kMonday + pick(50) * kHour) * 1000)},
+                          {"dtend", std::to_string((kMonday + 60 * kHour) * 1000)}}));
             return;
         }
         const auto& chosen =

@@ -3,10 +3,10 @@
 // Preloaded into a program: kills it at its n-th call of a function that changes a file, before the
 // call is done. QOR_KILL_AT holds n; without it nothing happens.
 #include <dlfcn.h>
-#include <signal.h>
 #include <sys/types.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <cstdlib>
 
 namespace {
@@ -40,17 +40,37 @@ extern "C" ssize_t write(int fd, const void* data, size_t size) {
     return next<decltype(write)>("write")(fd, data, size);
 }
 
-#define QOR_COUNTED(result, name, parameters, arguments) \
-    extern "C" result name parameters {                  \
-        count_call();                                    \
-        return next<result parameters>(#name) arguments; \
-    }
-QOR_COUNTED(ssize_t, pwrite, (int fd, const void* data, size_t size, off_t at),
-            (fd, data, size, at))
-QOR_COUNTED(ssize_t, pwrite64, (int fd, const void* data, size_t size, off64_t at),
-            (fd, data, size, at))
-QOR_COUNTED(int, fdatasync, (int fd), (fd))
-QOR_COUNTED(int, fsync, (int fd), (fd))
-QOR_COUNTED(int, ftruncate, (int fd, off_t size), (fd, size))
-QOR_COUNTED(int, ftruncate64, (int fd, off64_t size), (fd, size))
-QOR_COUNTED(int, unlink, (const char* path), (path))
+extern "C" ssize_t pwrite(int fd, const void* data, size_t size, off_t at) {
+    count_call();
+    return next<decltype(pwrite)>("pwrite")(fd, data, size, at);
+}
+
+extern "C" ssize_t pwrite64(int fd, const void* data, size_t size, off64_t at) {
+    count_call();
+    return next<decltype(pwrite64)>("pwrite64")(fd, data, size, at);
+}
+
+extern "C" int fdatasync(int fd) {
+    count_call();
+    return next<decltype(fdatasync)>("fdatasync")(fd);
+}
+
+extern "C" int fsync(int fd) {
+    count_call();
+    return next<decltype(fsync)>("fsync")(fd);
+}
+
+extern "C" int ftruncate(int fd, off_t size) noexcept {
+    count_call();
+    return next<int(int, off_t)>("ftruncate")(fd, size);
+}
+
+extern "C" int ftruncate64(int fd, off64_t size) noexcept {
+    count_call();
+    return next<int(int, off64_t)>("ftruncate64")(fd, size);
+}
+
+extern "C" int unlink(const char* path) noexcept {
+    count_call();
+    return next<int(const char*)>("unlink")(path);
+}
