@@ -144,6 +144,7 @@ std::vector<LogLine> faults::take_log(const FaultControl* control) {
     return log;
 }
 
+// NOLINTBEGIN(bugprone-macro-parentheses): types and names of a signature
 #define JOIN2(a, b) a##b
 #define JOIN(a, b) JOIN2(a, b)  // expands b first: ICU's names are macros
 
@@ -334,3 +335,4 @@ WRAP_ICU(void, ucal_setDate, (UCalendar * c, int32_t y, int32_t m, int32_t d, UE
 WRAP_ICU(void, ucal_add, (UCalendar * c, UCalendarDateFields f, int32_t n, UErrorCode* status),
          (c, f, n, status), )
 }
+// NOLINTEND(bugprone-macro-parentheses)
