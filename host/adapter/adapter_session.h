@@ -46,9 +46,9 @@ class AdapterSession {
     std::vector<int> deleted_ids();
     void clear_deleted_ids();
 
-    // Makes the adapter list everything that is in the calendar, its own writes included: it forgets
-    // which writes were its own, and its baseline becomes 0, as it does when a new session advances
-    // it before anything was notified.
+    // Makes the adapter list everything that is in the calendar, its own writes included: it
+    // forgets which writes were its own, and its baseline becomes 0, as it does when a new session
+    // advances it before anything was notified.
     void forget_everything();
 
     ItemValue get(int id) const;
