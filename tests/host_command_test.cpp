@@ -17,7 +17,7 @@
 #include "host/cloud/cloud_keys.h"
 #include "tests/host_bed.h"
 
-extern char** environ;
+extern char** environ;  // NOLINT(readability-redundant-declaration): not every libc declares it
 
 namespace bed {
 namespace {
@@ -76,7 +76,7 @@ class HostCommandTest : public HostTest {
         return on(name, {"--cloud", cloud_path(), "--json", "sign-in", "alice"});
     }
     std::string file_with(const std::string& text) {
-        const std::string path = (directory() / "document.json").string();
+        std::string path = (directory() / "document.json").string();
         std::ofstream(path) << text;
         return path;
     }
@@ -102,6 +102,7 @@ TEST_F(HostCommandTest, SaysWhatIsWrongAndWhatToDo) {
         const char* message;
     };
     const std::string nowhere = (directory() / "nowhere").string();
+    const std::string no_adapter = QOR_LIB_DIR "/libqor-platform.so";
     const Case cases[] = {
         {{}, 2, "a command is missing"},
         {{"snyc"}, 2, "there is no command 'snyc'; did you mean 'sync'?"},
@@ -114,7 +115,7 @@ TEST_F(HostCommandTest, SaysWhatIsWrongAndWhatToDo) {
         {{"--device", nowhere, "get", "x1"}, 3, "'x1' is no item number"},
         {{"--device", nowhere, "sign-in", "alice"}, 3, "no cloud is known yet"},
         {{"--device", nowhere, "--adapter", "/nowhere.so", "ids"}, 3, "cannot load the adapter"},
-        {{"--device", nowhere, "--adapter", QOR_LIB_DIR "/libqor-platform.so", "ids"},
+        {{"--device", nowhere, "--adapter", no_adapter, "ids"},
          3,
          "is no adapter: 23 of its 23 entry points are missing: qor_adapter_get_cid"},
     };
