@@ -104,9 +104,9 @@ TEST_F(HostCommandTest, SaysWhatIsWrongAndWhatToDo) {
     const std::string nowhere = (directory() / "nowhere").string();
     const std::string no_adapter = QOR_LIB_DIR "/libqor-platform.so";
     const Case cases[] = {
-        {{}, 2, "a command is missing"},
-        {{"snyc"}, 2, "there is no command 'snyc'; did you mean 'sync'?"},
-        {{"sync", "--polcy", "device"}, 2, "see qor-host sync --help"},
+        {{}, 2, "no command given; see 'qor-host --help'"},
+        {{"snyc"}, 2, "unknown command \"snyc\"; did you mean 'sync'?"},
+        {{"sync", "--polcy", "device"}, 2, "did you mean '--policy'?"},
         {{"sync", "--policy", "coin"}, 2, "--policy"},
         {{"watch", "--debounce", "-1"}, 2, "--debounce"},
         {{"get"}, 2, "item is required"},

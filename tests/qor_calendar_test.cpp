@@ -500,7 +500,7 @@ TEST_F(QorCalendarTest, BadInputIsRefusedWithTheNextStep) {
     const Case cases[] = {
         {"", 2, "no command given; see 'qor-calendar --help'"},
         {"agnda", 2, "unknown command \"agnda\"; did you mean 'agenda'?"},
-        {"list --jsn", 2, "list: unexpected \"--jsn\"; see 'qor-calendar list --help'"},
+        {"list --jsn", 2, "list: unexpected \"--jsn\"; did you mean '--json'?"},
         {"add --titel X --start 2014-01-01", 2, "add: --title is required"},
         {"add --title X --start 2014-01-01 --ala 5", 2, "did you mean '--alarm'?"},
         {"add --title X --start soon", 2, "--start: \"soon\" is no date or time"},

@@ -2,16 +2,15 @@
 //
 // qor-cloud: looks into a cloud file, brings .ics calendars in and out. One table of commands
 // drives dispatch and help.
-#include <CLI/CLI.hpp>
 #include <exception>
 
-#include "host/cli/terminal.h"
+#include "cli/command_line.h"
 #include "host/cloud/qor_cloud_commands.h"
 
 namespace qor {
 
 void print_error(const std::string& text) {
-    fmt::print(stderr, "qor-cloud: error: {}\n", one_line(text));
+    print_error("qor-cloud", text);
 }
 
 Exit fail(const Error& error) {
@@ -59,14 +58,7 @@ void declare_log(CLI::App& command, CloudArguments& arguments) {
         ->capture_default_str();
 }
 
-struct Command {
-    const char* name;
-    const char* help;
-    const char* more;
-    void (*declare)(CLI::App& command, CloudArguments& arguments);
-    Exit (*run)(const CloudArguments& arguments);
-};
-constexpr Command kCommands[] = {
+constexpr Command<CloudArguments> kCommands[] = {
     {"import", "Bring .ics calendars into the cloud.",
      "The same file imported twice changes nothing. What devices changed or deleted since the "
      "last\n"
@@ -102,9 +94,6 @@ constexpr Command kCommands[] = {
 
 void declare_all(CLI::App& app, CloudArguments& arguments) {
     app.name("qor-cloud");
-    app.fallthrough();
-    app.allow_extras();  // what is left over gets a better message than the library's
-    app.require_subcommand(0, 1);
     app.add_option("--cloud", arguments.cloud, "The cloud file")
         ->type_name("FILE")
         ->envname("QOR_CLOUD")
@@ -116,60 +105,16 @@ void declare_all(CLI::App& app, CloudArguments& arguments) {
     app.footer(
         "Exit status: 0 done, 1 partly (what is missing is listed), 2 wrong usage, 3 failed.\n"
         "'qor-cloud COMMAND --help' shows examples.");
-    for (const Command& command : kCommands) {
-        CLI::App* sub = app.add_subcommand(command.name, command.help);
-        sub->footer(command.more);
-        command.declare(*sub, arguments);
-    }
+    declare_commands(app, kCommands, arguments);
 }
 
-Exit refuse(const std::string& what, const std::string& meant, const std::string& help) {
-    print_error(fmt::format("{}; {}see 'qor-cloud{} --help'", what,
-                            meant.empty() ? "" : fmt::format("did you mean '{}'? ", meant), help));
-    return Exit::kUsage;
-}
-
-Exit run_chosen(const CLI::App& app, const CloudArguments& arguments) {
-    const std::vector<std::string> left_over = app.remaining();
-    const std::vector<CLI::App*> chosen = app.get_subcommands();
-    if (chosen.empty()) {
-        std::vector<std::string> names;
-        for (const Command& command : kCommands) {
-            names.emplace_back(command.name);
-        }
-        return left_over.empty() ? refuse("no command given", "", "")
-                                 : refuse(fmt::format("unknown command \"{}\"", left_over.front()),
-                                          nearest(left_over.front(), names), "");
-    }
-    const std::string name = chosen.front()->get_name();
-    if (!left_over.empty()) {
-        std::vector<std::string> options;
-        for (const CLI::App* declared : {const_cast<const CLI::App*>(chosen.front()), &app}) {
-            for (const CLI::Option* option : declared->get_options()) {
-                options.push_back(option->get_name());
-            }
-        }
-        return refuse(fmt::format("{}: unexpected \"{}\"", name, left_over.front()),
-                      nearest(left_over.front(), options), " " + name);
-    }
-    const Command* command = std::find_if(std::begin(kCommands), std::end(kCommands),
-                                          [&](const Command& c) { return name == c.name; });
-    return command->run(arguments);
-}
-
-Exit run(int argc, char** argv) {
+int run(int argc, char** argv) {
     CLI::App app("The cloud that devices sync with: one file of event documents.");
     CloudArguments arguments;
     declare_all(app, arguments);
-    try {
-        app.parse(argc, argv);
-        return run_chosen(app, arguments);
-    } catch (const CLI::Success& help) {
-        return static_cast<Exit>(app.exit(help));
-    } catch (const CLI::ParseError& error) {
-        const std::vector<CLI::App*> chosen = app.get_subcommands();
-        return refuse(error.what(), "", chosen.empty() ? "" : " " + chosen.front()->get_name());
-    }
+    int status = 0;
+    const auto* const command = choose_command(app, kCommands, argc, argv, &status);
+    return command != nullptr ? static_cast<int>(command->run(arguments)) : status;
 }
 
 }  // namespace
@@ -177,7 +122,7 @@ Exit run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     try {
-        return static_cast<int>(qor::run(argc, argv));
+        return qor::run(argc, argv);
     } catch (const std::exception& error) {
         qor::print_error(error.what());
         return static_cast<int>(qor::Exit::kFailed);

@@ -8,7 +8,7 @@
 #include <cstring>
 #include <nlohmann/json.hpp>
 
-#include "host/cli/terminal.h"
+#include "cli/terminal.h"
 #include "host/cloud/qor_cloud_commands.h"
 #include "host/ics/ics_export.h"
 #include "host/ics/ics_import.h"

@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "host/cli/exit_code.h"
+#include "cli/exit_code.h"
 #include "host/cloud/cloud_store.h"
 
 namespace qor {

@@ -1,13 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // qor-cloud list, show and log.
-#include <unistd.h>
-
 #include <algorithm>
 #include <map>
 #include <nlohmann/json.hpp>
 
-#include "host/cli/terminal.h"
+#include "cli/terminal.h"
 #include "host/cloud/qor_cloud_commands.h"
 #include "host/document/event_document.h"
 #include "host/document/zone.h"
@@ -18,6 +16,14 @@ namespace {
 using nlohmann::ordered_json;
 
 constexpr std::size_t kLongestTitle = 44;
+
+// "2014-03-15 08:30 UTC" of milliseconds since the epoch.
+std::string utc_text(std::int64_t ms) {
+    const WallTime t =
+        wall_time(ms / 1000 - (ms % 1000 < 0 ? 1 : 0), kUtcZone).value_or(WallTime{});
+    return fmt::format("{:04}-{:02}-{:02} {:02}:{:02} UTC", t.year, t.month, t.day, t.hour,
+                       t.minute);
+}
 
 // "2014-03-15" of an all-day event, else its start on its own zone's clock.
 std::string start_text(const EventDocument& event) {
@@ -164,7 +170,7 @@ Exit cloud_list(const CloudArguments& arguments) {
         table.add(std::move(cells));
     }
     if (!table.empty()) {
-        fmt::print("{}", table.text(isatty(STDOUT_FILENO) != 0));
+        table.print();
     }
     fmt::print(stderr, "{} at revision {}\n", plural(rows.size(), "document"), changes->revision);
     return Exit::kDone;
@@ -238,7 +244,7 @@ Exit cloud_log(const CloudArguments& arguments) {
     if (arguments.json) {
         fmt::print("{}", dumped(json));
     } else if (!table.empty()) {
-        fmt::print("{}", table.text(isatty(STDOUT_FILENO) != 0));
+        table.print();
     }
     return Exit::kDone;
 }

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "host/cli/exit_code.h"
+#include "cli/exit_code.h"
 #include "host/sync/context.h"
 
 namespace qor {

@@ -4,7 +4,7 @@
 // gets it. What it replaces there is kept in turn.
 #include <fmt/format.h>
 
-#include "host/cli/terminal.h"
+#include "cli/terminal.h"
 #include "host/command/command.h"
 #include "host/command/device.h"
 #include "host/command/output.h"

@@ -1,18 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // qor-host: the reference host. One table of commands drives dispatch and help.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
-#include <algorithm>
-#include <cstdio>
 #include <exception>
 #include <limits>
 #include <map>
 #include <string>
 #include <vector>
 
-#include "host/cli/terminal.h"
+#include "cli/command_line.h"
 #include "host/command/command.h"
 #include "host/failure.h"
 
@@ -20,13 +15,6 @@ namespace {
 
 using qor::Arguments;
 using qor::Exit;
-
-struct Command {
-    const char* name;
-    Exit (*run)(const Arguments&);
-    void (*options)(CLI::App&, Arguments&);  // null: it takes none
-    const char* help;
-};
 
 void sign_in_options(CLI::App& app, Arguments& a) {
     app.add_option("account", a.account, "The account's name")->required();
@@ -109,22 +97,22 @@ void update_options(CLI::App& app, Arguments& a) {
     app.add_option("file", a.file, "The document; - for standard input")->required();
 }
 
-constexpr Command kCommands[] = {
-    {"sign-in", qor::sign_in, sign_in_options,
-     "Connect this device to an account and a cloud (--cloud FILE, remembered)"},
-    {"sign-out", qor::sign_out, sign_out_options,
-     "Remove the account and its calendar from this device; the cloud keeps everything"},
-    {"sync", qor::sync, sync_options, "Bring device and cloud together, once"},
-    {"watch", qor::watch, watch_options, "Stay and sync whenever one side changes"},
-    {"status", qor::status, nullptr, "Items, pending occurrences, versions, the latest sync"},
-    {"conflicts", qor::conflicts, conflicts_options,
-     "Versions that lost a conflict: list them, show or restore one"},
-    {"log", qor::log, log_options, "What earlier runs did, item by item"},
-    {"ids", qor::shell_ids, ids_options, "Adapter shell: changed and deleted items"},
-    {"get", qor::shell_get, item_options, "Adapter shell: an item's document"},
-    {"insert", qor::shell_insert, insert_options, "Adapter shell: make an item of a document"},
-    {"update", qor::shell_update, update_options, "Adapter shell: replace an item's document"},
-    {"delete", qor::shell_delete, item_options, "Adapter shell: delete an item"},
+constexpr qor::Command<Arguments> kCommands[] = {
+    {"sign-in", "Connect this device to an account and a cloud (--cloud FILE, remembered)", "",
+     sign_in_options, qor::sign_in},
+    {"sign-out", "Remove the account and its calendar from this device; the cloud keeps everything",
+     "", sign_out_options, qor::sign_out},
+    {"sync", "Bring device and cloud together, once", "", sync_options, qor::sync},
+    {"watch", "Stay and sync whenever one side changes", "", watch_options, qor::watch},
+    {"status", "Items, pending occurrences, versions, the latest sync", "", nullptr, qor::status},
+    {"conflicts", "Versions that lost a conflict: list them, show or restore one", "",
+     conflicts_options, qor::conflicts},
+    {"log", "What earlier runs did, item by item", "", log_options, qor::log},
+    {"ids", "Adapter shell: changed and deleted items", "", ids_options, qor::shell_ids},
+    {"get", "Adapter shell: an item's document", "", item_options, qor::shell_get},
+    {"insert", "Adapter shell: make an item of a document", "", insert_options, qor::shell_insert},
+    {"update", "Adapter shell: replace an item's document", "", update_options, qor::shell_update},
+    {"delete", "Adapter shell: delete an item", "", item_options, qor::shell_delete},
 };
 
 constexpr const char* kExamples = R"(Examples:
@@ -136,73 +124,19 @@ constexpr const char* kExamples = R"(Examples:
 Exit status: 0 done, 1 some items were put aside (they are listed), 2 usage, 3 failed.
 Environment: QOR_LOG=stderr shows what the adapter logs.)";
 
-std::string did_you_mean(const std::string& typed) {
-    std::vector<std::string> names;
-    for (const Command& command : kCommands) {
-        names.emplace_back(command.name);
-    }
-    const std::string meant = qor::nearest(typed, names);
-    return meant.empty() ? "" : fmt::format("did you mean '{}'? ", meant);
-}
-
-void fail(const std::string& message) {
-    fmt::print(stderr, "qor-host: error: {}\n", message);
-}
-
-// The first word that is neither an option nor an option's value, as typed.
-std::string typed_command(int argc, char** argv) {
-    for (int i = 1; i < argc; ++i) {
-        std::string word = argv[i];
-        if (word == "--device" || word == "--adapter" || word == "--cloud") {
-            ++i;
-        } else if (!word.starts_with("-")) {
-            return word;
-        }
-    }
-    return {};
-}
-
-int usage_error(const CLI::ParseError& error, int argc, char** argv) {
-    const std::string typed = typed_command(argc, argv);
-    const bool known = std::any_of(std::begin(kCommands), std::end(kCommands),
-                                   [&](const Command& command) { return typed == command.name; });
-    if (typed.empty()) {
-        fail("a command is missing; see qor-host --help");
-    } else if (!known) {
-        fail(fmt::format("there is no command '{}'; {}see qor-host --help", typed,
-                         did_you_mean(typed)));
-    } else {
-        fail(fmt::format("{}; see qor-host {} --help", error.what(), typed));
-    }
-    return static_cast<int>(Exit::kUsage);
-}
-
 int run(int argc, char** argv) {
     CLI::App app("qor-host: keeps a device's calendar and a cloud the same");
     Arguments arguments;
+    app.name("qor-host");
     app.footer(kExamples);
-    app.require_subcommand(1);
-    app.fallthrough();
     app.add_option("--device", arguments.device, "The device's directory")->capture_default_str();
     app.add_option("--cloud", arguments.cloud, "The cloud's file; remembered at sign-in");
     app.add_option("--adapter", arguments.adapter, "The adapter library");
     app.add_flag("--json", arguments.json, "Answer in JSON");
-    const Command* chosen = nullptr;
-    for (const Command& command : kCommands) {
-        CLI::App* sub = app.add_subcommand(command.name, command.help);
-        if (command.options != nullptr) {
-            command.options(*sub, arguments);
-        }
-        sub->callback([&chosen, &command] { chosen = &command; });
-    }
-    try {
-        app.parse(argc, argv);
-    } catch (const CLI::Success& success) {
-        return app.exit(success);
-    } catch (const CLI::ParseError& error) {
-        return usage_error(error, argc, argv);
-    }
-    return static_cast<int>(chosen->run(arguments));
+    qor::declare_commands(app, kCommands, arguments);
+    int status = 0;
+    const auto* const command = qor::choose_command(app, kCommands, argc, argv, &status);
+    return command != nullptr ? static_cast<int>(command->run(arguments)) : status;
 }
 
 }  // namespace
@@ -211,7 +145,7 @@ int main(int argc, char** argv) {
     try {
         return run(argc, argv);
     } catch (const std::exception& error) {
-        fail(error.what());
+        qor::print_error("qor-host", error.what());
     }
     return static_cast<int>(Exit::kFailed);
 }

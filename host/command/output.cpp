@@ -10,7 +10,7 @@
 #include <cstdio>
 #include <map>
 
-#include "host/cli/terminal.h"
+#include "cli/terminal.h"
 
 namespace qor {
 

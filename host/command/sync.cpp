@@ -5,7 +5,7 @@
 #include <glib.h>
 
 #include "host/adapter/adapter_files.h"
-#include "host/cli/terminal.h"
+#include "cli/terminal.h"
 #include "host/command/command.h"
 #include "host/command/output.h"
 #include "host/command/runner.h"

@@ -3,6 +3,8 @@
 
 #include <charconv>
 
+#include "cli/command_line.h"
+
 namespace calendar_app {
 
 void print_json(const Json& json) {
@@ -10,7 +12,7 @@ void print_json(const Json& json) {
 }
 
 void print_error(const std::string& text) {
-    fmt::print(stderr, "qor-calendar: error: {}\n", text);
+    qor::print_error("qor-calendar", text);
 }
 
 void print_warnings(const calendar_text::Warnings& warnings) {

@@ -13,13 +13,14 @@
 #include <string>
 #include <vector>
 
+#include "cli/exit_code.h"
 #include "platform/calendar-service/app/occurrences.h"
 
 namespace calendar_app {
 
 using Json = nlohmann::ordered_json;
 
-enum class Exit { kDone = 0, kPartly = 1, kUsage = 2, kFailed = 3 };
+using qor::Exit;
 
 // Ends a command: what happened, on which item, what to do next.
 struct Failure : std::runtime_error {

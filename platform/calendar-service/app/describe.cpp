@@ -5,9 +5,9 @@
 
 #include <algorithm>
 
+#include "cli/terminal.h"
 #include "platform/calendar-service/app/agenda.h"
 #include "platform/calendar-service/app/rule.h"
-#include "platform/calendar-service/app/table.h"
 #include "platform/calendar-service/app/time_text.h"
 
 namespace calendar_app {
@@ -50,7 +50,7 @@ std::string cancelled_text(const Event& event) {
 }  // namespace
 
 std::string name_of(const Event& event) {
-    return fmt::format("event {} \"{}\"", event.id, one_line(text_or_empty(event.title)));
+    return fmt::format("event {} \"{}\"", event.id, qor::one_line(text_or_empty(event.title)));
 }
 
 std::string when_text(const Event& event, const Occurrence& when, const Zone& zone) {
@@ -104,7 +104,7 @@ Lines lines_of(const Event& event) {
         {"book", fmt::format("{}", event.book_id)},
     };
     for (auto& line : lines) {
-        line.second = one_line(line.second);
+        line.second = qor::one_line(line.second);
     }
     std::erase_if(lines, [](const auto& line) { return line.second.empty(); });
     return lines;

@@ -6,10 +6,10 @@
 #include <algorithm>
 #include <charconv>
 
+#include "cli/nearest.h"
+#include "cli/terminal.h"
 #include "platform/calendar-service/app/describe.h"
-#include "platform/calendar-service/app/nearest.h"
 #include "platform/calendar-service/app/rule.h"
-#include "platform/calendar-service/app/table.h"
 #include "platform/calendar-service/app/time_text.h"
 
 namespace calendar_app {
@@ -57,7 +57,7 @@ constexpr Removable kRemovables[] = {
 };
 
 void remove_value(const std::string& name, Event* event) {
-    Nearest nearest(name);
+    qor::Nearest nearest(name);
     std::vector<std::string> names;
     for (const Removable& removable : kRemovables) {
         if (name == removable.name) {
@@ -78,7 +78,7 @@ void set_text(const char* option, const std::optional<std::string>& value, Text*
     if (!value) {
         return;
     }
-    if (!is_utf8(*value)) {
+    if (!qor::is_utf8(*value)) {
         fail(Exit::kUsage, "{}: the text is not UTF-8; check the terminal's encoding", option);
     }
     *text = *value;

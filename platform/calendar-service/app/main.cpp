@@ -2,16 +2,12 @@
 //
 // qor-calendar: the calendar app of a device, for a terminal. One table of commands drives the
 // dispatch and the help.
-#include <CLI/CLI.hpp>
-
+#include "cli/command_line.h"
 #include "platform/calendar-service/app/app.h"
-#include "platform/calendar-service/app/nearest.h"
 #include "platform/calendar-service/app/store.h"
 
 namespace calendar_app {
 namespace {
-
-void declare_none(CLI::App&, Options&) {}
 
 void declare_book(CLI::App& command, Options& options) {
     command.add_option("--book", options.book, "Only this book (see 'books')")->type_name("ID");
@@ -100,18 +96,11 @@ void declare_agenda(CLI::App& command, Options& options) {
     declare_book(command, options);
 }
 
-struct Command {
-    const char* name;
-    const char* help;
-    const char* examples;
-    void (*declare)(CLI::App& command, Options& options);
-    Exit (*run)(const Options& options);
-};
-constexpr Command kCommands[] = {
+constexpr qor::Command<Options> kCommands[] = {
     {"books", "List the calendar books.",
      "Examples:\n"
      "  qor-calendar --device phone books",
-     declare_none, list_books},
+     nullptr, list_books},
     {"list", "List the events as they are stored, one line each.",
      "Examples:\n"
      "  qor-calendar list --book 1\n"
@@ -159,20 +148,8 @@ constexpr Command kCommands[] = {
      declare_agenda, show_agenda},
 };
 
-const Command* find_command(const std::string& name) {
-    for (const Command& command : kCommands) {
-        if (name == command.name) {
-            return &command;
-        }
-    }
-    return nullptr;
-}
-
 void declare_all(CLI::App& app, Options& options) {
     app.name("qor-calendar");
-    app.fallthrough();
-    app.allow_extras();  // what is left over gets a better message than the library's
-    app.require_subcommand(0, 1);
     app.add_option("--device", options.device, "The device's directory, made when missing")
         ->type_name("DIR")
         ->capture_default_str();
@@ -180,70 +157,21 @@ void declare_all(CLI::App& app, Options& options) {
     app.footer(
         "Exit status: 0 done, 1 partly, 2 wrong usage, 3 failed.\n"
         "'qor-calendar COMMAND --help' shows examples.");
-    for (const Command& command : kCommands) {
-        CLI::App* sub = app.add_subcommand(command.name, command.help);
-        sub->footer(command.examples);
-        command.declare(*sub, options);
-    }
-}
-
-std::string suggestion(const std::string& nearest) {
-    return nearest.empty() ? "" : fmt::format("did you mean '{}'? ", nearest);
-}
-
-[[noreturn]] void refuse_command(const std::string& name) {
-    calendar_text::Nearest nearest(name);
-    for (const Command& command : kCommands) {
-        nearest.offer(command.name);
-    }
-    fail(Exit::kUsage, "unknown command \"{}\"; {}see 'qor-calendar --help'", name,
-         suggestion(nearest.name()));
-}
-
-[[noreturn]] void refuse_argument(const std::string& argument, const CLI::App& command) {
-    calendar_text::Nearest nearest(argument);
-    for (const CLI::Option* option : command.get_options()) {
-        if (!option->get_positional()) {
-            nearest.offer(option->get_name());
-        }
-    }
-    fail(Exit::kUsage, "{}: unexpected \"{}\"; {}see 'qor-calendar {} --help'", command.get_name(),
-         argument, suggestion(nearest.name()), command.get_name());
-}
-
-// The command that was named, with everything after it understood.
-const Command& chosen_command(const CLI::App& app) {
-    const std::vector<std::string> left_over = app.remaining();
-    const std::vector<CLI::App*> chosen = app.get_subcommands();
-    if (chosen.empty()) {
-        if (left_over.empty()) {
-            fail(Exit::kUsage, "no command given; see 'qor-calendar --help'");
-        }
-        refuse_command(left_over.front());
-    }
-    if (!left_over.empty()) {
-        refuse_argument(left_over.front(), *chosen.front());
-    }
-    return *find_command(chosen.front()->get_name());
+    qor::declare_commands(app, kCommands, options);
 }
 
 int run(int argc, char** argv) {
     CLI::App app("The calendar of a device, for a terminal.");
     Options options;
     declare_all(app, options);
+    int status = 0;
+    const auto* const command = qor::choose_command(app, kCommands, argc, argv, &status);
+    if (command == nullptr) {
+        return status;
+    }
     try {
-        app.parse(argc, argv);
-        const Command& command = chosen_command(app);
         const Connection connection(options.device);
-        return static_cast<int>(command.run(options));
-    } catch (const CLI::Success& help) {
-        return app.exit(help);
-    } catch (const CLI::ParseError& error) {
-        const std::vector<CLI::App*> chosen = app.get_subcommands();
-        const std::string name = chosen.empty() ? "" : " " + chosen.front()->get_name();
-        print_error(fmt::format("{}{}; see 'qor-calendar{} --help'",
-                                name.empty() ? "" : name.substr(1) + ": ", error.what(), name));
-        return static_cast<int>(Exit::kUsage);
+        return static_cast<int>(command->run(options));
     } catch (const Failure& failure) {
         print_error(failure.what());
         return static_cast<int>(failure.exit);

@@ -3,12 +3,12 @@
 // books, list, show, agenda: the commands that change nothing.
 #include <chrono>
 
+#include "cli/terminal.h"
 #include "platform/calendar-service/app/agenda.h"
 #include "platform/calendar-service/app/app.h"
 #include "platform/calendar-service/app/describe.h"
 #include "platform/calendar-service/app/rule.h"
 #include "platform/calendar-service/app/store.h"
-#include "platform/calendar-service/app/table.h"
 #include "platform/calendar-service/app/time_text.h"
 
 namespace calendar_app {
@@ -74,7 +74,7 @@ Range range_given(const Options& options, const Zone& zone) {
 
 Exit list_books(const Options& options) {
     Json json = Json::array();
-    Table table({"BOOK", "NAME", "HOLDS", "ACCOUNT", "DESCRIPTION"});
+    qor::Table table({"BOOK", "NAME", "HOLDS", "ACCOUNT", "DESCRIPTION"});
     for (const Book& book : read_books()) {
         json.push_back({{"id", book.id},
                         {"name", text_or_empty(book.name)},
@@ -99,7 +99,7 @@ Exit list_events(const Options& options) {
     const std::vector<Event> events = read_all_events(chosen_book(options));
     warn_of_zones(events);
     Json json = Json::array();
-    Table table({"EVENT", "WHEN", "TITLE", "REPEATS", "NOTE"});
+    qor::Table table({"EVENT", "WHEN", "TITLE", "REPEATS", "NOTE"});
     for (const Event& event : events) {
         json.push_back(event_json(event));
         table.add({fmt::format("{}", event.id), when_text(event), text_or_empty(event.title),
@@ -148,7 +148,7 @@ Exit show_agenda(const Options& options) {
         print_json(agenda_json(agenda));
         return agenda.is_complete ? Exit::kDone : Exit::kPartly;
     }
-    Table table({"WHEN", "TITLE", "LOCATION", "EVENT"});
+    qor::Table table({"WHEN", "TITLE", "LOCATION", "EVENT"});
     for (const AgendaEntry& entry : agenda.entries) {
         table.add({when_text(*entry.event, entry.when, zone), text_or_empty(entry.event->title),
                    text_or_empty(entry.event->location), fmt::format("{}", entry.event->id)});

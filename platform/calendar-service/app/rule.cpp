@@ -7,7 +7,7 @@
 #include <cctype>
 #include <charconv>
 
-#include "platform/calendar-service/app/nearest.h"
+#include "cli/nearest.h"
 #include "platform/calendar-service/app/time_text.h"
 
 namespace calendar_text {
@@ -95,7 +95,7 @@ std::string set_until(const std::string& value, const Zone& zone, Event* event) 
 }
 
 std::string unknown_part(const std::string& name) {
-    Nearest nearest(name);
+    qor::Nearest nearest(name);
     for (const std::string_view known : {"FREQ", "INTERVAL", "COUNT", "UNTIL", "WKST"}) {
         nearest.offer(known);
     }

@@ -5,12 +5,12 @@
 
 #include <algorithm>
 
+#include "cli/terminal.h"
 #include "platform/calendar-service/app/app.h"
 #include "platform/calendar-service/app/describe.h"
 #include "platform/calendar-service/app/input.h"
 #include "platform/calendar-service/app/rule.h"
 #include "platform/calendar-service/app/store.h"
-#include "platform/calendar-service/app/table.h"
 #include "platform/calendar-service/app/time_text.h"
 
 namespace calendar_app {
@@ -136,7 +136,7 @@ int event_book(const std::string& id_text) {
     const Book book = find_book(id_of(id_text, "book"));
     if (book.type != CALENDAR_BOOK_TYPE_EVENT) {
         fail(Exit::kFailed, "book {} \"{}\" does not hold events; see 'qor-calendar books'",
-             book.id, one_line(text_or_empty(book.name)));
+             book.id, qor::one_line(text_or_empty(book.name)));
     }
     return book.id;
 }
@@ -301,7 +301,7 @@ Exit move_occurrence(const Options& options) {
         return Exit::kDone;
     }
     fmt::print("Moved the occurrence {} of {} to {}: event {} \"{}\".\n", when, name_of(parent),
-               when_text(exception), exception.id, one_line(text_or_empty(exception.title)));
+               when_text(exception), exception.id, qor::one_line(text_or_empty(exception.title)));
     return Exit::kDone;
 }
 

@@ -9,7 +9,7 @@
 #include <memory>
 #include <mutex>
 
-#include "platform/calendar-service/app/nearest.h"
+#include "cli/nearest.h"
 
 namespace calendar_text {
 namespace {
@@ -74,7 +74,7 @@ std::string Zone::nearest_id(const std::string& id) {
     UErrorCode status = U_ZERO_ERROR;
     const std::unique_ptr<icu::StringEnumeration> ids(
         icu::TimeZone::createTimeZoneIDEnumeration(UCAL_ZONE_TYPE_ANY, nullptr, nullptr, status));
-    Nearest nearest(id);
+    qor::Nearest nearest(id);
     while (U_SUCCESS(status) && ids) {
         const char* next = ids->next(nullptr, status);
         if (next == nullptr) {

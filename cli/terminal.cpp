@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// What tools show on a terminal. Keeps no state; any thread.
-#include "host/cli/terminal.h"
+// Keeps no state; any thread.
+#include "cli/terminal.h"
 
 #include <fmt/format.h>
 #include <unicode/uchar.h>
@@ -11,9 +11,6 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstdio>
-#include <numeric>
-
-#include "host/document/zone.h"
 
 namespace qor {
 namespace {
@@ -36,23 +33,16 @@ std::size_t width_of(UChar32 c) {
     return east_asian == U_EA_WIDE || east_asian == U_EA_FULLWIDTH ? 2 : 1;
 }
 
-// Letters to insert, remove or replace to turn one text into the other.
-std::size_t distance(std::string_view a, std::string_view b) {
-    std::vector<std::size_t> row(b.size() + 1);
-    std::iota(row.begin(), row.end(), std::size_t{0});
-    for (std::size_t i = 1; i <= a.size(); ++i) {
-        std::size_t diagonal = row[0];
-        row[0] = i;
-        for (std::size_t j = 1; j <= b.size(); ++j) {
-            const std::size_t changed = diagonal + (a[i - 1] == b[j - 1] ? 0 : 1);
-            diagonal = row[j];
-            row[j] = std::min({changed, row[j] + 1, row[j - 1] + 1});
+}  // namespace
+
+bool is_utf8(std::string_view text) {
+    for (std::size_t at = 0; at < text.size();) {
+        if (next_character(text, at) < 0) {
+            return false;
         }
     }
-    return row[b.size()];
+    return true;
 }
-
-}  // namespace
 
 std::string one_line(std::string_view text) {
     std::string line;
@@ -124,16 +114,8 @@ std::string Table::text(bool colour) const {
     return result;
 }
 
-std::string nearest(std::string_view typed, const std::vector<std::string>& candidates) {
-    std::string best;
-    std::size_t least = std::max<std::size_t>(2, typed.size() / 3) + 1;
-    for (const std::string& candidate : candidates) {
-        if (const std::size_t changes = distance(typed, candidate); changes < least) {
-            least = changes;
-            best = candidate;
-        }
-    }
-    return best;
+void Table::print() const {
+    fmt::print("{}", text(isatty(STDOUT_FILENO) != 0));
 }
 
 Progress::Progress(std::string what)
@@ -150,13 +132,6 @@ void Progress::show(std::size_t done, std::size_t total) {
         shown_ = true;
         fmt::print(stderr, "\r\033[K{} {}/{}", what_, done, total);
     }
-}
-
-std::string utc_text(long long ms) {
-    const WallTime t =
-        wall_time(ms / 1000 - (ms % 1000 < 0 ? 1 : 0), kUtcZone).value_or(WallTime{});
-    return fmt::format("{:04}-{:02}-{:02} {:02}:{:02} UTC", t.year, t.month, t.day, t.hour,
-                       t.minute);
 }
 
 std::string plural(std::size_t count, std::string_view noun) {

@@ -8,7 +8,7 @@
 #include <string>
 #include <string_view>
 
-namespace calendar_text {
+namespace qor {
 
 class Nearest {
   public:
@@ -25,4 +25,4 @@ class Nearest {
     std::size_t best_distance_ = std::numeric_limits<std::size_t>::max();
 };
 
-}  // namespace calendar_text
+}  // namespace qor

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// What tools show on a terminal: lines, tables that line up, progress, the command that was meant.
+// What the tools show on a terminal: lines, tables that line up, progress.
 #pragma once
 
 #include <cstddef>
@@ -10,6 +10,9 @@
 #include <vector>
 
 namespace qor {
+
+// Whether the bytes are well-formed UTF-8.
+bool is_utf8(std::string_view text);
 
 // The text on one line: control characters become blanks, what is not UTF-8 becomes U+FFFD.
 std::string one_line(std::string_view text);
@@ -30,14 +33,13 @@ class Table {
     bool empty() const { return rows_.size() == 1; }
     // Lines that end in "\n"; headings bold when `colour`.
     std::string text(bool colour = false) const;
+    // To stdout, headings bold on a terminal only.
+    void print() const;
 
   private:
     std::vector<std::vector<std::string>> rows_;  // the headings first
     std::vector<std::size_t> right_;
 };
-
-// The candidate that takes the fewest changed letters; empty when none is near.
-std::string nearest(std::string_view typed, const std::vector<std::string>& candidates);
 
 // A line on stderr that is written over again and again, on a terminal only.
 class Progress {
@@ -53,9 +55,6 @@ class Progress {
     bool on_terminal_;
     bool shown_ = false;
 };
-
-// "2014-03-15 08:30 UTC" of milliseconds since the epoch.
-std::string utc_text(long long ms);
 
 // "3 events", "1 event".
 std::string plural(std::size_t count, std::string_view noun);

@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "platform/calendar-service/app/nearest.h"
+#include "cli/nearest.h"
 
 #include <algorithm>
 #include <numeric>
 #include <vector>
 
-namespace calendar_text {
+namespace qor {
 namespace {
 
 char lower(char c) {
@@ -43,4 +43,4 @@ std::string Nearest::name() const {
     return best_distance_ <= limit ? best_ : std::string();
 }
 
-}  // namespace calendar_text
+}  // namespace qor

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// How the host's tools end.
+// How the command-line tools end.
 #pragma once
 
 namespace qor {
