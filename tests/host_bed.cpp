@@ -348,21 +348,25 @@ int TestDevice::add(const NewEvent& event) {
     return id;
 }
 
+void enter_title(int event, const std::string& title) {
+    Record record(event);
+    record.set(_calendar_event.summary, title);
+    check(calendar_db_update_record(record.get()), "update");
+}
+
+void enter_cancellation(int event, const std::string& instant) {
+    Record record(event);
+    const std::string before = text(record.get(), _calendar_event.exdate);
+    record.set(_calendar_event.exdate, before.empty() ? instant : before + "," + instant);
+    check(calendar_db_update_record(record.get()), "update");
+}
+
 void TestDevice::set_title(int event, const std::string& title) {
-    visit([&] {
-        Record record(event);
-        record.set(_calendar_event.summary, title);
-        check(calendar_db_update_record(record.get()), "update");
-    });
+    visit([&] { enter_title(event, title); });
 }
 
 void TestDevice::cancel_occurrence(int event, const std::string& instant) {
-    visit([&] {
-        Record record(event);
-        const std::string before = text(record.get(), _calendar_event.exdate);
-        record.set(_calendar_event.exdate, before.empty() ? instant : before + "," + instant);
-        check(calendar_db_update_record(record.get()), "update");
-    });
+    visit([&] { enter_cancellation(event, instant); });
 }
 
 int TestDevice::move_occurrence(int event, const std::string& instant, const NewEvent& moved) {

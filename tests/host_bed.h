@@ -75,6 +75,11 @@ class TestDevice {
     std::string cloud_path_;
 };
 
+// What the user does on the device that the process is at, connected to its calendar service: while
+// a sync runs.
+void enter_title(int event, const std::string& title);
+void enter_cancellation(int event, const std::string& instant);
+
 class HostTest : public ::testing::Test {
   protected:
     HostTest();

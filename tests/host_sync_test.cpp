@@ -3,12 +3,12 @@
 // Devices kept the same through a cloud: what users of such tools complain about, one test each.
 #include <gmock/gmock.h>
 
-#include <clocale>
 #include <cstdlib>
 #include <ctime>
 
 #include "host/sync/engine.h"
 #include "tests/host_bed.h"
+#include "tests/support/compiled_locale.h"
 
 namespace bed {
 namespace {
@@ -290,6 +290,45 @@ TEST_F(HostSyncTest, AnUndecidedConflictWaits) {
     expect_agreement(a, b);
 }
 
+// Between the listing of the device and its writing, while somebody is asked about a conflict.
+TEST_F(HostSyncTest, AnEditMadeDuringASyncIsNotOverwritten) {
+    TestDevice& a = device("a");
+    TestDevice& b = device("b");
+    const int standup = a.add(weekly("standup"));
+    a.add({});
+    sync_all();
+    a.cancel_occurrence(standup, "20260112T150000Z");
+    sync_all();
+    a.set_title(standup, "standup at ten");
+    a.set_title(a.find("event"), "at home");
+    a.sync();
+    const int series = b.find("standup");
+    const int event = b.find("event");
+    b.set_title(event, "at work");
+    qor::SyncOptions ask;
+    ask.policy = qor::Policy::kAsk;
+    int asked = 0;
+    ask.ask = [&](const qor::Conflict&) {
+        if (++asked == 1) {
+            enter_cancellation(series, "20260119T150000Z");
+            enter_title(event, "at work until six");
+        }
+        return qor::Winner::kCloud;
+    };
+    b.sync(ask);
+    b.with_database([&](qor::HostDatabase& database) {
+        const auto kept = qor::Conflicts(database.connection()).list();
+        ASSERT_FALSE(kept.empty());
+        EXPECT_THAT(kept.front().document + kept.back().document, HasSubstr("at work until six"));
+    });
+    sync_all();
+    EXPECT_THAT(a.contents(),
+                ElementsAre(testing::StartsWith("at home"),
+                            "standup at ten 1767625200-1767628800 Europe/Berlin every 1x2  10 "
+                            "times without 20260112T150000Z 20260119T150000Z"));
+    expect_agreement(a, b);
+}
+
 TEST_F(HostSyncTest, ASideThatLooksEmptyDeletesNothing) {
     TestDevice& a = device("a");
     TestDevice& b = device("b");
@@ -387,7 +426,7 @@ TEST_F(HostSyncTest, TimesStayInEveryZoneAndLocale) {
         SCOPED_TRACE(zone);
         setenv("TZ", zone, 1);
         tzset();
-        std::setlocale(LC_ALL, ++trip % 2 == 0 ? "C" : "C.UTF-8");
+        const CompiledLocale there(++trip % 2 == 0 ? "de_DE" : "tr_TR", directory());
         sync_all();
         EXPECT_EQ(a.contents(), before);
         expect_agreement(a, b);
@@ -398,7 +437,6 @@ TEST_F(HostSyncTest, TimesStayInEveryZoneAndLocale) {
     }
     unsetenv("TZ");
     tzset();
-    std::setlocale(LC_ALL, "C");
 }
 
 TEST_F(HostSyncTest, APreviewTellsAndChangesNothing) {

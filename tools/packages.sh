@@ -4,7 +4,7 @@
 
 build_packages=(g++ cmake ninja-build pkg-config libsqlite3-dev libglib2.0-dev libjson-glib-dev
     libicu-dev libical-dev libcli11-dev libfmt-dev nlohmann-json3-dev libgtest-dev libgmock-dev
-    libbenchmark-dev tzdata)
+    libbenchmark-dev locales tzdata)
 check_packages=(clang clang-format clang-tidy libclang-rt-14-dev)
 
 # need_packages NAME...: installs those that are missing, naming them first.

@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "host/adapter/adapter_files.h"
+#include "host/sync/versions.h"
 
 namespace qor {
 
@@ -15,7 +16,27 @@ namespace {
 
 constexpr std::size_t kBatch = 200;
 
-enum class Outcome { kDone, kPending, kFailed, kTouched };
+enum class Outcome {
+    kDone,
+    kPending,
+    kFailed,
+    kTouched,      // edited on the device since it was listed: the next round decides
+    kStaysAsItIs,  // an occurrence of a series that was not written after all
+};
+
+// Tells whether somebody else has written to the calendar since it was listed.
+class CalendarWatch {
+  public:
+    explicit CalendarWatch(int listed_version) : seen_(listed_version) {}
+
+    void before_own_write() { others_wrote_ = others_wrote_ || calendar_version() != seen_; }
+    void after_own_write() { seen_ = calendar_version(); }
+    bool others_wrote() const { return others_wrote_; }
+
+  private:
+    int seen_;
+    bool others_wrote_ = false;
+};
 
 struct Delivered {
     Outcome outcome = Outcome::kFailed;
@@ -96,11 +117,18 @@ Delivered update(SyncContext& context, const Delivery& delivery) {
     return result;
 }
 
-Delivered carry_out(SyncContext& context, const Delivery& delivery) {
+// Writing a series drops its list of cancelled occurrences, which no document shows: one that has
+// been cancelled since the listing would be lost.
+bool may_drop_a_cancellation(const Delivery& delivery) {
+    const auto present = SyncedDocument::parse(delivery.change.item->device_document);
+    return delivery.action == Action::kUpdate && (!present || present->recurring());
+}
+
+Delivered carry_out(SyncContext& context, const Delivery& delivery, bool others_wrote) {
     if (delivery.action == Action::kInsert) {
         return insert(context, delivery);
     }
-    if (touched(context, delivery)) {
+    if (touched(context, delivery) || (others_wrote && may_drop_a_cancellation(delivery))) {
         return {Outcome::kTouched, 0, {}, ""};
     }
     if (delivery.action == Action::kUpdate) {
@@ -116,21 +144,40 @@ Delivered carry_out(SyncContext& context, const Delivery& delivery) {
                                                : Delivered{Outcome::kDone, 0, {}, ""};
 }
 
+// What the batches of one round share.
+struct Round {
+    CalendarWatch calendar;
+    std::set<std::string> unwritten{};  // keys of series that were to be written and were not
+};
+
 class Batch {
   public:
-    Batch(SyncContext& context, const Delivery* first, const Delivery* last)
-        : context_(context), first_(first), last_(last) {}
+    Batch(SyncContext& context, Round& round, const Delivery* first, const Delivery* last)
+        : context_(context), round_(round), first_(first), last_(last) {}
 
     void run() {
         note_intents();
         for (const Delivery* delivery = first_; delivery != last_; ++delivery) {
-            results_.push_back(carry_out(context_, *delivery));
+            results_.push_back(write(*delivery));
         }
         check_cancellations();
         store_results();
     }
 
   private:
+    Delivered write(const Delivery& delivery) {
+        if (delivery.again && round_.unwritten.contains(delivery.document.parent_key())) {
+            return {Outcome::kStaysAsItIs, 0, {}, ""};
+        }
+        round_.calendar.before_own_write();
+        Delivered result = carry_out(context_, delivery, round_.calendar.others_wrote());
+        round_.calendar.after_own_write();
+        if (delivery.action == Action::kUpdate && result.outcome != Outcome::kDone) {
+            round_.unwritten.insert(delivery.change.key);
+        }
+        return result;
+    }
+
     void note_intents() {
         WriteBatch batch(context_.database.connection());
         const std::int64_t base = std::max(context_.database.number(setting::kHighestId),
@@ -180,6 +227,9 @@ class Batch {
             case Outcome::kTouched:
                 context_.journal.retry(
                     {delivery.change.key, "", delivery.change.label(), now_ms(), delivery.again});
+                return;
+            case Outcome::kStaysAsItIs:
+                context_.journal.drop_retry(delivery.change.key);
                 return;
             case Outcome::kFailed:
                 put_aside(delivery, result);
@@ -263,6 +313,7 @@ class Batch {
     }
 
     SyncContext& context_;
+    Round& round_;
     const Delivery* first_;
     const Delivery* last_;
     std::vector<Delivered> results_;
@@ -270,7 +321,7 @@ class Batch {
 
 }  // namespace
 
-void deliver(SyncContext& context, const std::vector<Delivery>& deliveries) {
+void deliver(SyncContext& context, const std::vector<Delivery>& deliveries, int listed_version) {
     {
         WriteBatch batch(context.database.connection());
         for (const Delivery& delivery : deliveries) {
@@ -281,6 +332,7 @@ void deliver(SyncContext& context, const std::vector<Delivery>& deliveries) {
         }
         batch.commit();
     }
+    Round round{CalendarWatch(listed_version)};
     const Delivery* const end = deliveries.data() + deliveries.size();
     for (const Delivery* first = deliveries.data(); first != end;) {
         // An adapter finds a parent by its key only once the parent's batch is committed.
@@ -289,7 +341,7 @@ void deliver(SyncContext& context, const std::vector<Delivery>& deliveries) {
                last - first < static_cast<std::ptrdiff_t>(kBatch)) {
             ++last;
         }
-        Batch(context, first, last).run();
+        Batch(context, round, first, last).run();
         first = last;
         context.progress("to the device", static_cast<std::size_t>(first - deliveries.data()),
                          deliveries.size());

@@ -152,7 +152,7 @@ bool run_round(SyncContext& context) {
     if (!plan.empty()) {
         settle_records(context, plan);
         push(context, plan.uploads);
-        deliver(context, plan.deliveries);
+        deliver(context, plan.deliveries, device_version);
     }
     commit_progress(context, plan, device_version);
     return !plan.empty();
