@@ -373,9 +373,9 @@ TEST_F(IcsTest, WhatDocumentsCannotCarryIsCountedByKind) {
         {vevent(start + "EXDATE:20260106T083000Z"), "EXDATE of an event without RRULE"},
         {vevent(start + "RRULE:FREQ=DAILY\nRRULE:FREQ=WEEKLY"), "RRULE, a second one"},
         {vevent(start + "RRULE:FREQ=HOURLY"), "RRULE with FREQ=HOURLY (devices show it once)"},
-        {vevent(start + "RRULE:FREQ=YEARLY;BYYEARDAY=10,20,30,40,50,60,70,80,90,100,110,120,130,"
-                        "140,150,160,170"),
-         "RRULE with BYYEARDAY longer than 63 characters (devices cannot read it)"},
+        {vevent(start + "RRULE:FREQ=YEARLY;BYYEARDAY=100,110,120,130,140,150,160,170,180,190,200,"
+                        "210,220,230,240,250,260,270,280,290,300,310,320,330"),
+         "RRULE with BYYEARDAY longer than 103 characters (devices cannot read it)"},
         {vevent(start + "BEGIN:VALARM\nACTION:DISPLAY\nTRIGGER;VALUE=DATE-TIME:20260105T080000Z\n"
                         "END:VALARM"),
          "VALARM at a fixed time"},

@@ -15,7 +15,7 @@ namespace {
 constexpr const char* kPartOrder[] = {"FREQ",     "INTERVAL",   "BYSECOND",  "BYMINUTE", "BYHOUR",
                                       "BYDAY",    "BYMONTHDAY", "BYYEARDAY", "BYWEEKNO", "BYMONTH",
                                       "BYSETPOS", "WKST",       "COUNT",     "UNTIL"};
-constexpr std::size_t kLongestPart = 63;  // a device reads a part into so many characters
+constexpr std::size_t kLongestPart = 103;  // what the adapter reads: "BYMONTHDAY=1,2,...,31" fits
 
 std::map<std::string, std::string> parts_of(const std::string& rule) {
     std::map<std::string, std::string> parts;
