@@ -381,6 +381,8 @@ TEST_F(IcsTest, WhatDocumentsCannotCarryIsCountedByKind) {
          "VALARM at a fixed time"},
         {vevent(start + "BEGIN:VALARM\nACTION:DISPLAY\nTRIGGER:-PT5M\nREPEAT:2\nEND:VALARM"),
          "VALARM REPEAT"},
+        {vevent(start + "BEGIN:PARTICIPANT\nUID:x\nEND:PARTICIPANT"),
+         "component of an unknown kind inside an event"},
         {"BEGIN:VTODO\nUID:t\nEND:VTODO\n", "VTODO"},
         {"BEGIN:VJOURNAL\nUID:t\nEND:VJOURNAL\n", "VJOURNAL"},
     };

@@ -396,7 +396,9 @@ void Reader::alarms(IcsEvent& event) {
         if (kind == ICAL_VALARM_COMPONENT) {
             alarm(event.document, part);
         } else {
-            count(icalcomponent_kind_to_string(kind));
+            const char* name = icalcomponent_kind_to_string(kind);
+            const bool named = name != nullptr && kind != ICAL_X_COMPONENT;
+            count(named ? name : "component of an unknown kind inside an event");
         }
     }
 }
