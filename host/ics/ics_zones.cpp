@@ -9,6 +9,7 @@
 #include <unicode/ustring.h>
 
 #include <algorithm>
+#include <functional>
 #include <vector>
 
 namespace qor {
@@ -51,6 +52,8 @@ std::string best_known_zone(const std::string& zone) {
 }
 
 constexpr int kComparedYears = 3;
+constexpr int kLaterYear = 2030;      // no zone's table foresees a change after it
+constexpr int kLaterExceptions = 18;  // of 72: summer time that begins and ends a month apart
 
 // Offsets from UTC on the 1st and 16th of each month, as a zone's rules give them.
 std::vector<int> offsets(icaltimezone* rules, int year) {
@@ -70,14 +73,16 @@ std::vector<int> offsets(icaltimezone* rules, int year) {
     return result;
 }
 
-bool has_offsets(const std::string& zone, int year, const std::vector<int>& expected) {
+// Whether the zone has these offsets, save at most `exceptions` of them.
+bool has_offsets(const std::string& zone, int year, const std::vector<int>& expected,
+                 int exceptions) {
     std::size_t at = 0;
     for (int month = 0; month < 12 * kComparedYears; ++month) {
         for (const int day : {1, 16}) {
             const std::int64_t instant =
                 utc_instant({year + month / 12, month % 12 + 1, day, 12, 0, 0});
             const auto wall = wall_time(instant, zone);
-            if (!wall || utc_instant(*wall) - instant != expected[at++]) {
+            if ((!wall || utc_instant(*wall) - instant != expected[at++]) && exceptions-- == 0) {
                 return false;
             }
         }
@@ -85,25 +90,42 @@ bool has_offsets(const std::string& zone, int year, const std::vector<int>& expe
     return true;
 }
 
-// A zone whose clocks go as these rules do; empty when there is none.
-std::string zone_with_offsets(int year, const std::vector<int>& expected) {
+bool changes(const std::vector<int>& offsets) {
+    return std::ranges::adjacent_find(offsets, std::not_equal_to()) != offsets.end();
+}
+
+// A zone whose clocks go as these rules do; empty when there is none. Zones went alike for years
+// and then parted, so it should do nearly the same later on, where the rules tell of later.
+std::string zone_with_rules(icaltimezone* rules, int year) {
+    const std::vector<int> expected = offsets(rules, year);
+    const std::vector<int> later = offsets(rules, kLaterYear);
+    const bool rules_end = changes(expected) && !changes(later);
+    std::vector<std::pair<int, std::string>> votes;  // of all regions for their best known zone
+    std::string parted;
     UErrorCode status = U_ZERO_ERROR;
     UEnumeration* zones = ucal_openTimeZoneIDEnumeration(UCAL_ZONE_TYPE_CANONICAL_LOCATION, nullptr,
                                                          nullptr, &status);
-    std::string found;
     int32_t length = 0;
-    while (found.empty() && !U_FAILURE(status)) {
+    while (!U_FAILURE(status)) {
         const char* id = uenum_next(zones, &length, &status);
         if (id == nullptr) {
             break;
         }
-        if (has_offsets(id, year, expected)) {
-            const std::string better = best_known_zone(id);
-            found = has_offsets(better, year, expected) ? better : id;
+        if (!has_offsets(id, year, expected, 0)) {
+            continue;
         }
+        const std::string better = best_known_zone(id);
+        const std::string zone = has_offsets(better, year, expected, 0) ? better : id;
+        if (!rules_end && !has_offsets(zone, kLaterYear, later, kLaterExceptions)) {
+            parted = zone;
+            continue;
+        }
+        const auto vote = std::ranges::find(votes, zone, &std::pair<int, std::string>::second);
+        ++(vote == votes.end() ? votes.emplace_back(0, zone) : *vote).first;
     }
     uenum_close(zones);
-    return found;
+    const auto most = std::ranges::max_element(votes, {}, &std::pair<int, std::string>::first);
+    return most == votes.end() ? parted : most->second;
 }
 
 }  // namespace
@@ -154,6 +176,13 @@ std::string olson_zone(const std::string& name) {
         }
         const std::size_t slash = name.find('/', at);
         at = slash == std::string::npos ? slash : slash + 1;
+    }
+    if (const std::size_t dash = name.find('-'); dash != std::string::npos) {
+        std::string with_slash = name;  // "America-Chicago"
+        with_slash[dash] = '/';
+        if (is_known_zone(with_slash)) {
+            return with_slash;
+        }
     }
     UChar result[128];
     UErrorCode status = U_ZERO_ERROR;
@@ -207,7 +236,7 @@ std::optional<IcsZone> IcsZones::by_name(const std::string& tzid) const {
 IcsZone IcsZones::by_rules(const std::string& tzid, icaltimezone* rules, int year) {
     // Producers describe the zone's present rules; long before and after, tables differ.
     year = std::clamp(year, 1990, 2034);
-    const std::string olson = zone_with_offsets(year, offsets(rules, year));
+    const std::string olson = zone_with_rules(rules, year);
     if (!olson.empty()) {
         report_.zones[tzid] =
             fmt::format("{}, whose clocks go as the file's VTIMEZONE says", olson);
