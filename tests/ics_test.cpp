@@ -200,6 +200,7 @@ TEST_F(IcsTest, AlarmsCountMinutesBeforeTheStart) {
         {"TRIGGER;VALUE=DATE-TIME:20260105T080000Z", {}},
         {"TRIGGER:-PT5M\nEND:VALARM\nBEGIN:VALARM\nACTION:AUDIO\nTRIGGER:-PT90S", {5, 1}},
         {"DESCRIPTION:none", {}},
+        {"TRIGGER:-PT10M\nX-OWN:1\nEND:VALARM\nBEGIN:VALARM\nTRIGGER:-PT5M\nACTION:NONE", {10}},
     };
     for (const auto& c : cases) {
         SCOPED_TRACE(c.trigger);
@@ -237,6 +238,7 @@ TEST_F(IcsTest, ZonesAreKnownByManyNames) {
         {"/example.org/20210210_1/America/Argentina/Buenos_Aires", "",
          "America/Argentina/Buenos_Aires", -180, true},
         {"Tokyo Standard Time", "", "Asia/Tokyo", 540, true},
+        {"America-Chicago", "", "America/Chicago", -300, true},
         {"My zone", vtimezone("My zone", "X-LIC-LOCATION:Asia/Kolkata\n" + odd_rules),
          "Asia/Kolkata", 330, true},
         {"(UTC+01:00) Mitte", vtimezone("(UTC+01:00) Mitte", kBerlinRules), nullptr, 120, true},
@@ -266,6 +268,34 @@ TEST_F(IcsTest, ZonesAreKnownByManyNames) {
     }
 }
 
+TEST_F(IcsTest, OfZonesThatOnceWentAlikeTheOneThatKeptItsRulesIsTaken) {
+    const auto rules = [](const char* winter, const char* summer, const char* spring_dates,
+                          const char* autumn_dates) {
+        return fmt::format(
+            "BEGIN:DAYLIGHT\nDTSTART:19870405T020000\nTZOFFSETFROM:{0}\nTZOFFSETTO:{1}\n{2}\n"
+            "END:DAYLIGHT\nBEGIN:STANDARD\nDTSTART:19871025T020000\nTZOFFSETFROM:{1}\n"
+            "TZOFFSETTO:{0}\n{3}\nEND:STANDARD\n",
+            winter, summer, spring_dates, autumn_dates);
+    };
+    const struct {
+        std::string rules;
+        const char* zone;  // not Whitehorse or Mexico City, which gave up changing their clocks
+    } cases[] = {
+        {rules("-0800", "-0700", "RRULE:FREQ=YEARLY;BYMONTH=4;BYDAY=1SU",
+               "RRULE:FREQ=YEARLY;BYMONTH=10;BYDAY=-1SU"),
+         "America/Los_Angeles"},
+        {rules("-0600", "-0500", "RDATE:19970406T020000,19980405T020000,19990404T020000",
+               "RDATE:19971026T020000,19981025T020000,19991031T020000"),
+         "America/Chicago"},
+    };
+    for (const auto& c : cases) {
+        SCOPED_TRACE(c.zone);
+        reset();
+        import(calendar(vtimezone("Mine", c.rules) + vevent("DTSTART;TZID=Mine:19970701T120000")));
+        EXPECT_EQ(parsed().zone, c.zone);
+    }
+}
+
 TEST_F(IcsTest, FloatingTimesTakeTheCalendarsZone) {
     import("BEGIN:VCALENDAR\nX-WR-TIMEZONE:Asia/Tokyo\n" + vevent("DTSTART:20260105T090000") +
                "END:VCALENDAR\n",
@@ -278,15 +308,15 @@ const char* const kSeries =
     "SUMMARY:Choir\nDTSTART;TZID=Europe/Berlin:20260105T193000\nDURATION:PT2H\nRRULE:FREQ=WEEKLY";
 
 TEST_F(IcsTest, OccurrencesNameTheirEventAndInstant) {
-    const ImportSummary summary = import(calendar(
-        vevent("RECURRENCE-ID;TZID=Europe/Berlin:20260112T193000\nSUMMARY:Late\n"
-               "DTSTART;TZID=Europe/Berlin:20260112T203000") +
-        vevent(std::string(kSeries) +
-               "\nEXDATE;TZID=Europe/Berlin:20260119T193000,20260126T193000\n"
-               "EXDATE:20260202T183000Z\nEXDATE;VALUE=DATE:20260209\n"
-               "EXDATE;TZID=Europe/Berlin:20260112T193000") +
-        vevent("RECURRENCE-ID:20260216T183000Z\nSTATUS:CANCELLED\nDTSTART:20260216T183000Z") +
-        vevent("RECURRENCE-ID:20260223T183000Z\nDTSTART;VALUE=DATE:20260223")));
+    const ImportSummary summary =
+        import(calendar(vevent("RECURRENCE-ID;TZID=Europe/Berlin:20260112T193000\nSUMMARY:Late\n"
+                               "DTSTART;TZID=Europe/Berlin:20260112T203000") +
+                        vevent(std::string(kSeries) +
+                               "\nEXDATE;TZID=Europe/Berlin:20260119T193000,20260126T193000\n"
+                               "EXDATE:20260202T183000Z\nEXDATE;VALUE=DATE:20260209\n"
+                               "EXDATE;TZID=Europe/Berlin:20260112T193000") +
+                        vevent("RECURRENCE-ID:20260216T183000Z\nSTATUS:CANCELLED") +
+                        vevent("RECURRENCE-ID:20260223T183000Z\nDTSTART;VALUE=DATE:20260223")));
     EXPECT_EQ(summary.events, 1U);
     EXPECT_EQ(summary.changed_occurrences, 2U);
     EXPECT_EQ(summary.cancelled_occurrences, 5U);
@@ -381,6 +411,13 @@ TEST_F(IcsTest, WhatDocumentsCannotCarryIsCountedByKind) {
          "VALARM at a fixed time"},
         {vevent(start + "BEGIN:VALARM\nACTION:DISPLAY\nTRIGGER:-PT5M\nREPEAT:2\nEND:VALARM"),
          "VALARM REPEAT"},
+        {vevent(start + "BEGIN:VALARM\nACTION:NONE\nTRIGGER:-PT5M\nEND:VALARM"),
+         "VALARM with ACTION:NONE (no alert)"},
+        {vevent(start + "DTSTAMP;VALUE=DATE:20260105"), "DTSTAMP;VALUE"},
+        {vevent(start + "LOCATION;VALUE=URI:https://x.org"), "LOCATION;VALUE"},
+        {vevent(start + "RDATE;VALUE=PERIOD:x"), "RDATE"},
+        {vevent("SUMMARY:a\n" + start, "a uid"),
+         "UID with characters that no key can have (a digest takes its place)"},
         {vevent(start + "BEGIN:PARTICIPANT\nUID:x\nEND:PARTICIPANT"),
          "component of an unknown kind inside an event"},
         {"BEGIN:VTODO\nUID:t\nEND:VTODO\n", "VTODO"},

@@ -56,6 +56,7 @@ class Reader {
         void (Reader::*read)(IcsEvent&, Property);
     };
     static const Row kRows[];
+    static const Row* row_of(icalproperty_kind kind);
 
     template <std::optional<std::string> EventDocument::*Member>
     void text(IcsEvent& event, Property property) {
@@ -81,7 +82,7 @@ class Reader {
     void end(IcsEvent& event);
     void all_day_marker(IcsEvent& event, IcsTime& end);
     void alarms(IcsEvent& event);
-    void alarm(EventDocument& document, icalcomponent* alarm);
+    void alarm(IcsEvent& event, icalcomponent* alarm);
     void count_parameters(Property property);
     static std::string plain_text(Property property);
     std::optional<IcsTime> time(Property property);
@@ -120,6 +121,12 @@ const Reader::Row Reader::kRows[] = {
     {ICAL_DURATION_PROPERTY, &Reader::nothing},
     {ICAL_DTSTAMP_PROPERTY, &Reader::nothing},
 };
+
+const Reader::Row* Reader::row_of(icalproperty_kind kind) {
+    const Row* row = std::find_if(std::begin(kRows), std::end(kRows),
+                                  [&](const Row& candidate) { return candidate.kind == kind; });
+    return row == std::end(kRows) ? nullptr : row;
+}
 
 std::string Reader::plain_text(Property property) {
     const icalvalue* value = icalproperty_get_value(property);
@@ -238,15 +245,27 @@ void Reader::stored_zone(IcsEvent& event, Property property) {
     event.document.zone = zone == "none" ? std::nullopt : std::optional(zone);
 }
 
+// libical tells in words what it dropped; the event's own title or time is a problem, anything
+// that would not have been carried is counted.
 void Reader::error(IcsEvent& event, Property property) {
     const std::string what = value_text(property);
-    const std::size_t colon = what.rfind(": ");
-    const std::string name = colon == std::string::npos ? "" : what.substr(colon + 2);
-    const bool is_name = !name.empty() && std::ranges::all_of(name, [](char c) {
-        return g_ascii_isalnum(c) != 0 || c == '-';
-    });
-    if (is_name && what.starts_with("Parse error in property name")) {
-        count(name);  // a name that libical does not know
+    const auto name_after = [&](std::string_view words) {
+        const std::size_t found = what.find(words);
+        const std::size_t from = found == std::string::npos ? what.size() : found + words.size();
+        const auto ends = [](char c) { return g_ascii_isalnum(c) == 0 && c != '-'; };
+        const auto begin = what.begin() + static_cast<std::ptrdiff_t>(from);
+        return std::string(begin, std::find_if(begin, what.end(), ends));
+    };
+    const std::string unknown = name_after("Parse error in property name: ");
+    const std::string untyped = name_after("Invalid VALUE type for property ");
+    const std::string dropped = name_after(" value in ");
+    const icalproperty_kind kind = icalproperty_string_to_kind(dropped.c_str());
+    if (!unknown.empty() && what.ends_with(": " + unknown)) {
+        count(unknown);  // a name that libical does not know
+    } else if (!untyped.empty()) {
+        count(untyped + ";VALUE");  // read as if the parameter were not there
+    } else if (!dropped.empty() && (kind == ICAL_DTSTAMP_PROPERTY || row_of(kind) == nullptr)) {
+        count(dropped);
     } else if (what.find("No value for") == std::string::npos) {  // "LOCATION:" is an empty text
         problem(event, fmt::format("not understood: {}", what));
     }
@@ -333,13 +352,19 @@ void Reader::end(IcsEvent& event) {
 }
 
 bool Reader::times(IcsEvent& event) {
-    const Property property = first(ICAL_DTSTART_PROPERTY);
+    Property property = first(ICAL_DTSTART_PROPERTY);
+    std::string reason;
+    for (Property error = first(ICAL_XLICERROR_PROPERTY); error != nullptr;
+         error = icalcomponent_get_next_property(component_, ICAL_XLICERROR_PROPERTY)) {
+        const std::string what = value_text(error);
+        reason = what.find("DTSTART") == std::string::npos ? reason : what;
+    }
+    if (property == nullptr && reason.empty()) {
+        property = first(ICAL_RECURRENCEID_PROPERTY);  // who cancels an occurrence says no more
+    }
     const auto start = property == nullptr ? std::nullopt : time(property);
     if (!start) {
-        const Property error = first(ICAL_XLICERROR_PROPERTY);
-        problem(event,
-                (error == nullptr ? std::string("it has no usable DTSTART") : value_text(error)) +
-                    "; left out");
+        problem(event, (reason.empty() ? "it has no usable DTSTART" : reason) + "; left out");
         return false;
     }
     event.start = *start;
@@ -347,15 +372,22 @@ bool Reader::times(IcsEvent& event) {
     return true;
 }
 
-void Reader::alarm(EventDocument& document, icalcomponent* alarm) {
+void Reader::alarm(IcsEvent& event, icalcomponent* alarm) {
+    EventDocument& document = event.document;
     constexpr std::int64_t kMostMinutes = std::numeric_limits<std::int32_t>::max() / 60;
     const Property trigger = icalcomponent_get_first_property(alarm, ICAL_TRIGGER_PROPERTY);
     for (Property property = icalcomponent_get_first_property(alarm, ICAL_ANY_PROPERTY);
          property != nullptr;
          property = icalcomponent_get_next_property(alarm, ICAL_ANY_PROPERTY)) {
         const std::string name = name_text(property);
+        if (name == "ACTION" && value_text(property) == "NONE") {
+            count("VALARM with ACTION:NONE (no alert)");
+            return;
+        }
         if (name == "ACTION" && value_text(property) != "DISPLAY") {
             count("VALARM with ACTION:" + value_text(property) + " (becomes a plain alert)");
+        } else if (icalproperty_isa(property) == ICAL_XLICERROR_PROPERTY) {
+            error(event, property);
         } else if (name == "DESCRIPTION") {  // required there; counts if it says something
             const std::string text = plain_text(property);
             if (text != title_ && text != "Reminder") {
@@ -394,7 +426,7 @@ void Reader::alarms(IcsEvent& event) {
          part != nullptr; part = icalcomponent_get_next_component(component_, ICAL_ANY_COMPONENT)) {
         const icalcomponent_kind kind = icalcomponent_isa(part);
         if (kind == ICAL_VALARM_COMPONENT) {
-            alarm(event.document, part);
+            alarm(event, part);
         } else {
             const char* name = icalcomponent_kind_to_string(kind);
             const bool named = name != nullptr && kind != ICAL_X_COMPONENT;
@@ -410,10 +442,7 @@ bool Reader::read(IcsEvent& event) {
     const bool usable = times(event);
     for (Property property = first(ICAL_ANY_PROPERTY); property != nullptr;
          property = icalcomponent_get_next_property(component_, ICAL_ANY_PROPERTY)) {
-        const icalproperty_kind kind = icalproperty_isa(property);
-        const Row* row = std::find_if(std::begin(kRows), std::end(kRows),
-                                      [&](const Row& candidate) { return candidate.kind == kind; });
-        if (row != std::end(kRows)) {
+        if (const Row* row = row_of(icalproperty_isa(property)); row != nullptr) {
             if (usable) {
                 (this->*row->read)(event, property);
                 count_parameters(property);

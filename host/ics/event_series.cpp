@@ -36,6 +36,9 @@ void SeriesCollection::add(IcsEvent event) {
         count("UID missing (known by what the event says)", event);
     }
     const std::string uid = uid_of(event);
+    if (key_from_uid(uid) != uid) {
+        count("UID with characters that no key can have (a digest takes its place)", event);
+    }
     const auto [found, is_new] = by_uid_.try_emplace(uid, series_.size());
     if (is_new) {
         series_.push_back({uid, {}, {}});
