@@ -12,6 +12,7 @@
 #include <algorithm>
 #include <csignal>
 #include <ctime>
+#include <nlohmann/json.hpp>
 #include <stdexcept>
 
 #include "host/adapter/adapter_session.h"

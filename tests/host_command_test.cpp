@@ -13,6 +13,7 @@
 #include <csignal>
 #include <fstream>
 #include <iterator>
+#include <nlohmann/json.hpp>
 
 #include "host/cloud/cloud_keys.h"
 #include "tests/host_bed.h"

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
 
 #include "host/document/synced_document.h"
 

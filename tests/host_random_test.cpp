@@ -7,6 +7,7 @@
 
 #include <csignal>
 #include <cstdlib>
+#include <nlohmann/json.hpp>
 #include <random>
 #include <set>
 

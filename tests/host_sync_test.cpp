@@ -5,6 +5,7 @@
 
 #include <cstdlib>
 #include <ctime>
+#include <nlohmann/json.hpp>
 
 #include "host/sync/engine.h"
 #include "tests/host_bed.h"

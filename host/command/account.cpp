@@ -3,6 +3,7 @@
 // sign-in and sign-out. Both can be interrupted anywhere and done again.
 #include <fmt/format.h>
 #include <qor_platform.h>
+#include <nlohmann/json.hpp>
 
 #include "host/adapter/adapter_files.h"
 #include "host/command/command.h"

@@ -3,6 +3,7 @@
 // conflicts: the documents that lost, and putting one back into the cloud, from where every device
 // gets it. What it replaces there is kept in turn.
 #include <fmt/format.h>
+#include <nlohmann/json.hpp>
 
 #include "cli/terminal.h"
 #include "host/command/command.h"

@@ -9,6 +9,7 @@
 
 #include <cstdio>
 #include <map>
+#include <nlohmann/json.hpp>
 
 #include "cli/terminal.h"
 

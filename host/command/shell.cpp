@@ -9,6 +9,7 @@
 #include <iostream>
 #include <iterator>
 #include <memory>
+#include <nlohmann/json.hpp>
 
 #include "host/command/command.h"
 #include "host/command/device.h"

@@ -3,9 +3,10 @@
 // status, log: what is known, and what was done. They only read, beside whatever is at work.
 #include <fmt/format.h>
 #include <qor_platform.h>
+#include <nlohmann/json.hpp>
 
-#include "host/adapter/adapter_files.h"
 #include "cli/terminal.h"
+#include "host/adapter/adapter_files.h"
 #include "host/command/command.h"
 #include "host/command/output.h"
 #include "host/command/runner.h"

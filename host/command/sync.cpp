@@ -3,9 +3,10 @@
 // sync: one sync, with a preview and the wait for pending occurrences.
 #include <fmt/format.h>
 #include <glib.h>
+#include <nlohmann/json.hpp>
 
-#include "host/adapter/adapter_files.h"
 #include "cli/terminal.h"
+#include "host/adapter/adapter_files.h"
 #include "host/command/command.h"
 #include "host/command/output.h"
 #include "host/command/runner.h"

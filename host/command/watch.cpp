@@ -12,6 +12,7 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
+#include <nlohmann/json.hpp>
 #include <system_error>
 
 #include "host/command/command.h"

@@ -9,6 +9,7 @@
 #include <array>
 #include <cstdlib>
 #include <map>
+#include <nlohmann/json.hpp>
 #include <utility>
 
 #include "host/document/rule_until.h"
@@ -164,17 +165,43 @@ void copy_member(const Json& from, Json& to, const char* key) {
 
 }  // namespace
 
+SyncedDocument::SyncedDocument() : root_(std::make_unique<Json>()) {}
+SyncedDocument::SyncedDocument(const SyncedDocument& other)
+    : root_(std::make_unique<Json>(*other.root_)) {}
+SyncedDocument::SyncedDocument(SyncedDocument&& other) noexcept = default;
+SyncedDocument& SyncedDocument::operator=(SyncedDocument other) noexcept {
+    root_.swap(other.root_);
+    return *this;
+}
+SyncedDocument::~SyncedDocument() = default;
+
 std::optional<SyncedDocument> SyncedDocument::parse(std::string_view text) {
     if (nested_too_deep(text)) {
         return std::nullopt;
     }
     SyncedDocument document;
-    document.root_ = Json::parse(text, nullptr, false);
-    if (!document.root_.is_object() || !document.root_.contains("EVENT") ||
+    *document.root_ = Json::parse(text, nullptr, false);
+    if (!document.root().is_object() || !document.root().contains("EVENT") ||
         !document.event().is_object()) {
         return std::nullopt;
     }
     return document;
+}
+
+void SyncedDocument::set(const std::string& key, const std::string& value) {
+    event()[key] = value;
+}
+
+std::string SyncedDocument::text() const {
+    return root_->dump();
+}
+
+Json& SyncedDocument::event() {
+    return (*root_)["EVENT"];
+}
+
+const Json& SyncedDocument::event() const {
+    return std::as_const(*root_)["EVENT"];
 }
 
 std::string SyncedDocument::value(const char* key) const {

@@ -6,7 +6,8 @@
 #pragma once
 
 #include <cstdint>
-#include <nlohmann/json.hpp>
+#include <memory>
+#include <nlohmann/json_fwd.hpp>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -19,9 +20,14 @@ enum class ItemKind {
     kCancelled,  // one occurrence of a recurring event, cancelled
 };
 
-// NOLINTNEXTLINE(bugprone-exception-escape): the JSON library's moves do not throw.
 class SyncedDocument {
   public:
+    SyncedDocument();
+    SyncedDocument(const SyncedDocument& other);
+    SyncedDocument(SyncedDocument&& other) noexcept;
+    SyncedDocument& operator=(SyncedDocument other) noexcept;
+    ~SyncedDocument();
+
     // No value for a text that is not an event document, or is nested beyond reason.
     static std::optional<SyncedDocument> parse(std::string_view text);
 
@@ -33,18 +39,18 @@ class SyncedDocument {
     // For people: the title and when, "Dentist (2026-01-05 14:00 UTC)".
     std::string label() const;
 
-    void set(const std::string& key, const std::string& value) { event()[key] = value; }
-    std::string text() const { return root_.dump(); }
+    void set(const std::string& key, const std::string& value);
+    std::string text() const;
 
-    nlohmann::ordered_json& event() { return root_["EVENT"]; }
-    const nlohmann::ordered_json& event() const { return root_["EVENT"]; }
-    nlohmann::ordered_json& root() { return root_; }
-    const nlohmann::ordered_json& root() const { return root_; }
+    nlohmann::ordered_json& event();
+    const nlohmann::ordered_json& event() const;
+    nlohmann::ordered_json& root() { return *root_; }
+    const nlohmann::ordered_json& root() const { return *root_; }
 
   private:
     // The text value of a key; empty when there is none.
     std::string value(const char* key) const;
-    nlohmann::ordered_json root_;
+    std::unique_ptr<nlohmann::ordered_json> root_;  // null only once moved from
 };
 
 // Whether a device would show the same for both. What a device does not keep is left out; of a

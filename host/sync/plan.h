@@ -40,7 +40,6 @@ struct Upload {
     std::optional<std::int64_t> expected;
 };
 
-// NOLINTNEXTLINE(bugprone-exception-escape): the JSON library's moves do not throw.
 struct Delivery {
     Action action = Action::kInsert;
     KeyChange change;

@@ -5,7 +5,7 @@
 // two devices are equal texts when the devices show a person the same things.
 #pragma once
 
-#include <nlohmann/json.hpp>
+#include <nlohmann/json_fwd.hpp>
 #include <vector>
 
 #include "platform/calendar-service/app/event.h"

@@ -2,6 +2,7 @@
 #include "platform/calendar-service/app/app.h"
 
 #include <charconv>
+#include <nlohmann/json.hpp>
 
 #include "cli/command_line.h"
 

@@ -7,7 +7,7 @@
 #include <fmt/format.h>
 
 #include <cstdio>
-#include <nlohmann/json.hpp>
+#include <nlohmann/json_fwd.hpp>
 #include <optional>
 #include <stdexcept>
 #include <string>

@@ -2,6 +2,7 @@
 //
 // books, list, show, agenda: the commands that change nothing.
 #include <chrono>
+#include <nlohmann/json.hpp>
 
 #include "cli/terminal.h"
 #include "platform/calendar-service/app/agenda.h"

@@ -4,6 +4,7 @@
 #include <fmt/ranges.h>
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 
 #include "cli/terminal.h"
 #include "platform/calendar-service/app/app.h"
