@@ -1,8 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // A sync that is killed at a write, any write, and run again: nothing is lost, and nothing is there
-// twice. By default every 7th write is tried; QOR_KILL_EVERY=1
-// tries all of them.
+// twice. By default every 7th write is tried; QOR_KILL_EVERY=1 tries all of them.
 #include <fmt/format.h>
 #include <gmock/gmock.h>
 
