@@ -86,7 +86,7 @@ void qor_adapters_json_parser_parse_buffer(const char* text, size_t length,
     if (length > static_cast<size_t>(G_MAXSSIZE) || !is_shallow_json(text, length)) {
         return;
     }
-    const Parser parser(json_parser_new());
+    const Parser parser(json_parser_new());  // GLib (2.36 on) starts its types by itself
     if (!parser || json_parser_load_from_data(parser.get(), text, static_cast<gssize>(length),
                                               nullptr) != TRUE) {
         return;
