@@ -362,6 +362,12 @@ TEST_F(IcsTest, OccurrencesFindTheirEventInTheCloudOrStandAlone) {
     EXPECT_EQ(summary.report.not_carried.size(), 1U);
     EXPECT_FALSE(parsed("e#20260112T000000Z").is_occurrence());
     reset();
+    // Some producers give a whole series a RECURRENCE-ID.
+    import(calendar(vevent(std::string(kSeries) + "\nRECURRENCE-ID:19700101T000000Z\n"
+                                                  "EXDATE;TZID=Europe/Berlin:20260112T193000")));
+    EXPECT_TRUE(parsed("e#19700101T000000Z").rule);
+    EXPECT_TRUE(parsed("e#19700101T000000Z#20260112T183000Z").cancelled);
+    reset();
     import(calendar(vevent(kSeries)));
     summary = import(later);
     EXPECT_TRUE(summary.report.not_carried.empty());

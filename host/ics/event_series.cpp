@@ -122,12 +122,7 @@ Status SeriesCollection::append(Series& series) {
             own_key += "~" + text_digest(event.document.to_text()).substr(0, 8);
             count("UID that different events share (kept apart)", event);
         }
-        append_event(event, own_key);
-        std::vector<IcsEvent> none;
-        append_occurrences({own_key, event.document.all_day,
-                            event.start.is_date ? IcsZone{kUtcZone, nullptr} : *event.start.zone,
-                            event.start.wall},
-                           &event, first ? series.occurrences : none);
+        append_event(event, own_key, first ? series.occurrences : std::vector<IcsEvent>());
     }
     if (!events.empty()) {
         return Done{};
@@ -144,13 +139,18 @@ Status SeriesCollection::append(Series& series) {
     return Done{};
 }
 
-void SeriesCollection::append_event(const IcsEvent& event, const std::string& key) {
+void SeriesCollection::append_event(const IcsEvent& event, const std::string& key,
+                                    const std::vector<IcsEvent>& occurrences) {
     ++summary_.events;
     want(key, event.document, event);
+    append_occurrences(
+        {key, event.document.all_day,
+         event.start.is_date ? IcsZone{kUtcZone, nullptr} : *event.start.zone, event.start.wall},
+        &event, occurrences);
 }
 
 void SeriesCollection::append_occurrences(const Parent& parent, const IcsEvent* event,
-                                          std::vector<IcsEvent>& occurrences) {
+                                          const std::vector<IcsEvent>& occurrences) {
     std::map<std::int64_t, const IcsEvent*> changed;
     for (const IcsEvent& occurrence : occurrences) {
         const std::int64_t instance =
@@ -203,14 +203,15 @@ void SeriesCollection::append_occurrences(const Parent& parent, const IcsEvent* 
 }
 
 // A changed occurrence of an event that is nowhere would wait for it for ever.
-void SeriesCollection::append_orphans(const std::string& key, std::vector<IcsEvent>& occurrences) {
+void SeriesCollection::append_orphans(const std::string& key,
+                                      const std::vector<IcsEvent>& occurrences) {
     for (const IcsEvent& occurrence : occurrences) {
         if (occurrence.cancelled) {
             count("cancelled occurrence of an event that is not there (left out)", occurrence);
             continue;
         }
         count("changed occurrence of an event that is not there (stored as an event)", occurrence);
-        append_event(occurrence, occurrence_key(key, occurrence.recurrence_id->ms()));
+        append_event(occurrence, occurrence_key(key, occurrence.recurrence_id->ms()), {});
     }
 }
 

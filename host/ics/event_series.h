@@ -40,10 +40,11 @@ class SeriesCollection {
     };
 
     Status append(Series& series);
-    void append_event(const IcsEvent& event, const std::string& key);
+    void append_event(const IcsEvent& event, const std::string& key,
+                      const std::vector<IcsEvent>& occurrences);
     void append_occurrences(const Parent& parent, const IcsEvent* event,
-                            std::vector<IcsEvent>& occurrences);
-    void append_orphans(const std::string& key, std::vector<IcsEvent>& occurrences);
+                            const std::vector<IcsEvent>& occurrences);
+    void append_orphans(const std::string& key, const std::vector<IcsEvent>& occurrences);
     std::vector<IcsEvent> newest(std::vector<IcsEvent> events);
     Result<std::optional<Parent>> parent_in_store(const std::string& key) const;
     void want(const std::string& key, const EventDocument& document, const IcsEvent& event);
