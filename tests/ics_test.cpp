@@ -88,7 +88,7 @@ TEST_F(IcsTest, AnEventBecomesItsDocument) {
     import(calendar(vevent(
         "SUMMARY:One\\, two\nLOCATION:Room\nDESCRIPTION:a\\nb; folded\n  here\n"
         "DTSTART;TZID=Europe/Berlin:20260105T093000\nDTEND;TZID=Europe/Berlin:20260105T103000\n"
-        "RRULE:FREQ=WEEKLY;COUNT=3;BYDAY=MO\nORGANIZER;CN=\"Ann, A.\":mailto:a@x.org\n"
+        "RRULE:FREQ=WEEKLY;COUNT=3;BYDAY=MO\nORGANIZER;CN=\"Ann, ^'A.^'\":mailto:a@x.org\n"
         "GEO:37.566535;-0.5\nBEGIN:VALARM\nACTION:DISPLAY\nTRIGGER:-PT15M\nEND:VALARM")));
     EXPECT_EQ(
         text_of("e"),
@@ -96,7 +96,7 @@ TEST_F(IcsTest, AnEventBecomesItsDocument) {
         R"("eventStatus":"0","eventTimezone":"Europe/Berlin","dtstart":"1767601800000",)"
         R"("dtend":"1767605400000","accessLevel":"0","hasAlarm":"1",)"
         R"("rrule":"FREQ=WEEKLY;INTERVAL=1;BYDAY=MO;COUNT=3","hasAttendeeData":"0",)"
-        R"("organizer":"Ann, A.","longitude":"-0500000","latitude":"37566535"},)"
+        R"("organizer":"Ann, \"A.\"","longitude":"-0500000","latitude":"37566535"},)"
         R"("REMINDERS":[{"method":"1","minutes":"15"}]})");
     import(calendar(vevent("DTSTART;VALUE=DATE:20260105", "d")));
     EXPECT_EQ(text_of("d"), R"({"EVENT":{"eventStatus":"0","allDay":"1","dtstart":"1767571200000",)"
@@ -690,6 +690,7 @@ TEST_F(IcsTest, WhatAFileCannotSayPlainlySurvivesTheRoundTrip) {
         R"("eventTimezone":"Mars/Olympus","dtstart":"1792891800000","dtend":"1792895400000")",
         R"("allDay":"1","eventTimezone":"Asia/Tokyo","dtstart":"1767571200000","dtend":"1767657600000")",
         R"("title":" \"quoted\" ; , \\\u0001 \t","dtstart":"0","dtend":"1000","organizer":"Ann: & Co; x")",
+        R"("dtstart":"0","dtend":"1000","organizer":"\"Ann\" ^n \\\\ ^\n\t'B'")",
         R"("dtstart":"0","dtend":"1000","longitude":"-0500000","latitude":"-90000000")",
     };
     std::vector<CloudWrite> writes;

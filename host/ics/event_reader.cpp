@@ -224,7 +224,9 @@ void Reader::position(IcsEvent& event, Property property) {
 
 // A document has room for one text: the name where there is one.
 void Reader::organizer(IcsEvent& event, Property property) {
-    const std::string name = parameter_text(property, "CN");
+    icalparameter* cn = icalproperty_get_first_parameter(property, ICAL_CN_PARAMETER);
+    const char* text = cn == nullptr ? nullptr : icalparameter_get_cn(cn);
+    const std::string name = text == nullptr ? "" : text;
     std::string address = value_text(property);
     if (g_ascii_strncasecmp(address.c_str(), "mailto:", 7) == 0) {
         address.erase(0, 7);

@@ -155,12 +155,9 @@ void Writer::add_organizer() {
         add(icalproperty_new_organizer(("mailto:" + name).c_str()));
         return;
     }
-    const std::string wanted = name;
-    for (char& c : name) {  // what a parameter cannot hold
-        c = c == '"' ? '\'' : c == '\\' ? '/' : c == '\n' || c == '\t' ? ' ' : c;
-    }
-    if (name != wanted) {
-        count("organizer with quotes, backslashes or line ends (replaced)");
+    // libical writes quotes and line ends as "^'" and "^n" (RFC 6868), but not a "^" itself.
+    for (std::size_t at = 0; (at = name.find('^', at)) != std::string::npos; at += 2) {
+        name.insert(at, 1, '^');
     }
     icalproperty* property = icalproperty_new_organizer("invalid:nomail");
     icalproperty_set_parameter(property, icalparameter_new_cn(name.c_str()));
