@@ -115,8 +115,11 @@ TEST_F(ChangesTest, WithoutAPendingListThereIsNothingAndClearingStillMovesTheBas
     EXPECT_EQ(stored_version(), "0");
     char** texts = nullptr;
     int count = 0;
-    EXPECT_EQ(qor_adapter_data_sync_get_dirty_ids_p(nullptr, &count), 6);
-    EXPECT_EQ(qor_adapter_data_sync_get_deleted_ids_p(&texts, nullptr), 6);
+    for (const auto query_ids :
+         {qor_adapter_data_sync_get_dirty_ids_p, qor_adapter_data_sync_get_deleted_ids_p}) {
+        EXPECT_EQ(query_ids(nullptr, &count), 6);
+        EXPECT_EQ(query_ids(&texts, nullptr), 6);
+    }
     EXPECT_THAT(log(), IsEmpty());
 }
 
@@ -164,6 +167,9 @@ TEST_F(ChangesTest, AKnownRecurringEventIsFollowedByItsOccurrences) {
     set_text(parent, _calendar_event.exdate, "20140315T093000Z, 20140316T093000Z");
     notify();
     EXPECT_EQ(dirty(), (Ids{0, 5, {"1", "2", "3", "4", "6"}}));
+    set_text(parent, _calendar_event.exdate, "");
+    notify();
+    EXPECT_EQ(dirty(), (Ids{0, 3, {"1", "2", "3"}}));
 }
 
 TEST_F(ChangesTest, AChangedOccurrenceThatIsListedItselfHasNoOccurrencesOfItsOwn) {

@@ -74,6 +74,9 @@ TEST_F(LifecycleTest, TheEntriesThatDoNothingSucceedInAnyState) {
                                                            nullptr, &files),
               0);
     EXPECT_EQ(files, nullptr);
+    EXPECT_EQ(qor_adapter_data_sync_get_files_for_downsync(nullptr, nullptr, nullptr, nullptr,
+                                                           nullptr, nullptr),
+              0);
 }
 
 TEST_F(LifecycleTest, TheFirstInitialiseMakesTheBookOfTheLastAccount) {

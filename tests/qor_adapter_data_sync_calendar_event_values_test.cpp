@@ -254,6 +254,9 @@ TEST_F(ValuesTest, ADocumentThatFailsIsRefusedByInsertAndAppliedByUpdate) {
     lines();
     EXPECT_EQ(update(id, broken), 0);  // Deliberate: with what was read before the failure.
     EXPECT_EQ(get(id)["EVENT"]["title"], "Half");
+    // A host without a place for the number gets none.
+    EXPECT_EQ(adapter_.data_sync_insert_value(nullptr, event("Dinner").c_str(), nullptr), 0);
+    EXPECT_EQ(get("2")["EVENT"]["title"], "Dinner");
 }
 
 TEST_F(ValuesTest, OccurrencesAfterTheirParentAreAppliedAtOnce) {
@@ -348,6 +351,7 @@ TEST_F(ValuesTest, TheRetryAddsWithoutABlankAndClearsAListThatHasTheEntry) {
         return text(read(parent_event), _calendar_event.exdate);
     };
     EXPECT_EQ(retry_with(nullptr, kStart), "20260105T090000Z");
+    EXPECT_EQ(retry_with("", kStart), "20260105T090000Z");
     EXPECT_EQ(retry_with("20260105T090000Z", kStart + kDay), "20260105T090000Z,20260106T090000Z");
     EXPECT_EQ(retry_with("20260105T090000Z,20260106T090000Z", kStart + kDay), "");
     EXPECT_EQ(retry_with("x20260105T090000Zx", kStart), "");  // a substring counts as listed
@@ -355,6 +359,29 @@ TEST_F(ValuesTest, TheRetryAddsWithoutABlankAndClearsAListThatHasTheEntry) {
     lines();
     EXPECT_EQ(retry_with(full.c_str(), kStart), full);  // never cut
     EXPECT_THAT(lines(), ElementsAre(critical(kRetryExdate, "fail")));
+}
+
+TEST_F(ValuesTest, ARetryThatFailsSaysSoAndIsMadeAgain) {
+    const std::string id = insert(occurrence("Moved", "parent-key", kStart + kDay, false));
+    insert(weekly("Stand-up"), "parent-key");
+    const struct {
+        const char* function;
+        const char* message;
+    } cases[] = {{"calendar_record_create", "record_create fail"},
+                 {"calendar_record_set_str", "parse_event_from_json fail"},
+                 {"calendar_db_insert_record", "db_insert fail"}};
+    for (const auto& c : cases) {
+        insert(event("arms the timer"));
+        lines();
+        faults()->fail(c.function, 1);
+        run_retry();
+        faults()->clear();
+        EXPECT_THAT(lines(), ::testing::Contains(critical(kRetry, c.message)));
+        EXPECT_EQ(row_of(id), "0|0|1|1|0|20260106T090000Z");
+    }
+    insert(event("arms the timer"));
+    run_retry();
+    EXPECT_EQ(get(id)["EVENT"]["title"], "Moved");
 }
 
 TEST_F(ValuesTest, AListThatIsFullIsNeverCut) {

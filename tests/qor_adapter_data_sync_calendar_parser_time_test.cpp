@@ -288,18 +288,22 @@ TEST_F(TimeTest, EachFailureIsReportedAndLeavesASafeValue) {
         {make, "calloc", "(null)", calloc_log + " | _qor_calendar_convert_ltos" + no_ucal},
         {make, "ucal_open", "(null)", open_log + " | _qor_calendar_convert_ltos" + no_ucal},
         {make, "ucal_setMillis", "(null)", "_qor_calendar_convert_ltos" + set_log},
+        {make, "ucal_get", "(null)",
+         "_qor_calendar_convert_ltos: ucal_get failed (U_INTERNAL_PROGRAM_ERROR)"},
         {make, "strdup", "(null)", ""},
         {parse, "calloc", "1394875800", calloc_log + as_utc},
         {parse, "ucal_open", "1394875800", open_log + as_utc},
         {all_day, "calloc", "0 1394875800", "_qor_calendar_set_allday: Failed to calloc"},
         {all_day, "ucal_open", "-1 1394875800", ""},
         {all_day, "ucal_setMillis", "-1 1394875800", ""},
+        {all_day, "ucal_get", "-1 1394875800", ""},
         {milliseconds, "ucal_setMillis", "0 1394875800", ""},
         {end, "calendar_record_get_caltime", "6 0", ""},
         {end, "calendar_record_set_caltime", "0 0", ""},
         {end, "ucal_open", start, open_log + " | __qor_calendar_get_day" + no_ucal},
         {end, "ucal_setDate", start, "__qor_calendar_get_day" + set_log},
         {end, "ucal_add", start, "__qor_calendar_get_day" + set_log},
+        {end, "ucal_get", start, "__qor_calendar_get_day" + set_log},
     };
     for (const auto& c : cases) {
         SCOPED_TRACE(c.function);

@@ -167,12 +167,14 @@ TEST(JsonParseBuffer, UnusableArgumentsArePrintedOrLogged) {
     EXPECT_EQ(get_child(&empty, &child, 0), 0);
     EXPECT_EQ(get_child(&document.root, nullptr, 0), 0);
     EXPECT_EQ(get_child(&document.root, &child, -1), 0);
+    JsonWalk walk = walk_json_children(nullptr);
+    EXPECT_EQ(next_json_child(&walk, &child), 0);
     EXPECT_EQ(qor_adapters_json_parser_parse_buffer_get_value(nullptr), -1);
     qor_adapters_json_parser_parse_buffer(nullptr, 3, &empty);
     qor_adapters_json_parser_parse_buffer("[1]", 0, &empty);
     EXPECT_EQ(describe(empty), "- NONE none 0");
     std::string expected;
-    for (int i = 0; i < 7; ++i) {
+    for (int i = 0; i < 8; ++i) {
         expected += "Invalid Input Parameters\n";
     }
     EXPECT_EQ(printed.text(), expected);
@@ -209,6 +211,10 @@ TEST(JsonParseBuffer, WithoutMemoryThereIsNoRootOrNoName) {
 TEST(JsonParseBuffer, ATextNestedDeeperThan256LevelsIsNotJson) {
     const int many = 1000000;
     const std::string deep(many, '[');
+    std::string pairs;  // more brackets than levels
+    for (int i = 0; i < 300; ++i) {
+        pairs += "{},";
+    }
     const struct {
         const char* name;
         std::string text;
@@ -221,23 +227,30 @@ TEST(JsonParseBuffer, ATextNestedDeeperThan256LevelsIsNotJson) {
         {"a million levels", nest(many), false},
         {"never closed", deep, false},
         {"side by side", "[" + nest(255) + "," + nest(255) + "]", true},
+        {"objects side by side", "[" + pairs + "0]", true},
         {"in a string", "[\"" + deep + "\"]", true},
         {"after an escaped quote", R"(["\"[)" + deep + "\"]", true},
         {"after an escaped backslash", R"(["\\",")" + deep + "\"]", true},
         {"after a quote that a backslash does not escape", R"(["\\")" + deep + "\"]", false},
         {"after a character of two escapes", R"(["\ud83d\ude00)" + deep + "\"]", true},
         {"after an escape", R"(["\u00e9)" + deep + "\"]", true},
+        {"after an escape next to half a character", R"(["\ud7ff)" + deep + "\"]", true},
         // The library takes the quote after these for a part of the string.
         {"after half a character", R"(["\ud800",")" + deep, false},
         {"after another half", R"(["\udfff",")" + deep, false},
+        {"after half a character and another escape", R"(["\ud800\n",")" + deep, false},
         {"after a short escape", R"(["\u12",")" + deep, false},
+        {"after an escape of no digit", R"(["\ug000",")" + deep, false},
+        {"after an escape of one digit", R"(["\u0g00",")" + deep, false},
+        {"after an escape of two digits", R"(["\u00g0",")" + deep, false},
         {"after a short second half", R"(["\ud83d\ude",")" + deep, false},
         {"after a quote in a comment", R"(/*"*/)" + deep, false},
         {"after a quote in single quotes", R"(['"',)" + deep, false},
         {"after closing brackets", "]]]]" + deep, false},
         {"a comment above 256 levels", "/**/" + nest(256), true},
-        {"a string that ends in a backslash", R"(["\)", false},
-        {"a string that ends in an escape", R"(["\u00)", false},
+        {"a string that does not end", "[" + pairs + R"("a)", false},
+        {"a string that ends in a backslash", "[" + pairs + R"("\)", false},
+        {"a string that ends in an escape", "[" + pairs + R"("\u00)", false},
     };
     for (const auto& c : cases) {
         SCOPED_TRACE(c.name);

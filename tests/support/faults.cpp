@@ -218,6 +218,7 @@ WRAP(int, calendar_record_set_str, (Rec r, Uint p, const char* v), (r, p, v), kC
 WRAP(int, db_util_open, (const char* p, sqlite3** d, int o), (p, d, o), SQLITE_CANTOPEN)
 WRAP(int, sqlite3_bind_text, (sqlite3_stmt * s, int i, const char* t, int n, void (*f)(void*)),
      (s, i, t, n, f), SQLITE_NOMEM)
+WRAP(const unsigned char*, sqlite3_column_text, (sqlite3_stmt * s, int i), (s, i), nullptr)
 WRAP(int, sqlite3_step, (sqlite3_stmt * s), (s), SQLITE_IOERR)
 WRAP(int, fchmod, (int f, mode_t m), (f, m), -1)
 
@@ -334,5 +335,10 @@ WRAP_ICU(void, ucal_setDate, (UCalendar * c, int32_t y, int32_t m, int32_t d, UE
          (c, y, m, d, status), )
 WRAP_ICU(void, ucal_add, (UCalendar * c, UCalendarDateFields f, int32_t n, UErrorCode* status),
          (c, f, n, status), )
+WRAP_ICU(int32_t, ucal_get, (const UCalendar* c, UCalendarDateFields f, UErrorCode* status),
+         (c, f, status), 0)
+WRAP_ICU(UDate, ucal_getMillis, (const UCalendar* c, UErrorCode* status), (c, status), 0)
+WRAP_ICU(int32_t, ucal_getTimeZoneID,
+         (const UCalendar* c, UChar* id, int32_t n, UErrorCode* status), (c, id, n, status), 0)
 }
 // NOLINTEND(bugprone-macro-parentheses)
