@@ -48,13 +48,14 @@ class QorCloudTest : public ::testing::Test {
         std::ofstream(folder_ / name) << "BEGIN:VCALENDAR\nBEGIN:VEVENT\nUID:" << uid << "\n"
                                       << lines << "END:VEVENT\nEND:VCALENDAR\n";
     }
-    Outcome run(const std::string& arguments, const std::string& environment = "") {
+    Outcome run(const std::string& arguments, const std::string& environment = "",
+                const std::string& program = "qor-cloud") {
         const std::string id = std::to_string(++runs_);
         const fs::path out = folder_ / ("out" + id);
         const fs::path err = folder_ / ("err" + id);
-        const std::string command = fmt::format(
-            "cd '{}' && env -u QOR_CLOUD {} '{}/qor-cloud' {} >'{}' 2>'{}'", folder_.string(),
-            environment, QOR_BIN_DIR, arguments, out.string(), err.string());
+        const std::string command =
+            fmt::format("cd '{}' && env -u QOR_CLOUD {} '{}/{}' {} >'{}' 2>'{}'", folder_.string(),
+                        environment, QOR_BIN_DIR, program, arguments, out.string(), err.string());
         const int status = std::system(command.c_str());
         return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, file_text(out), file_text(err)};
     }
@@ -150,6 +151,46 @@ TEST_F(QorCloudTest, AnExportImportsAsItIs) {
     EXPECT_EQ(json::parse(run("import --json all.ics").out)["files"][0]["unchanged"], 2);
     EXPECT_EQ(run("export - | '" QOR_BIN_DIR "/qor-cloud' --cloud second.db import -").status, 0);
     EXPECT_EQ(json::parse(run("list --cloud second.db --json").out)["documents"].size(), 2U);
+}
+
+TEST_F(QorCloudTest, TheExamplesComeOutAsLibicalReadsThem) {
+    const std::string examples = QOR_SOURCE_DIR "/examples/*.ics";
+    ASSERT_EQ(run("import --zone Europe/Berlin " + examples).status, 0);
+    ASSERT_EQ(run("export all.ics").status, 0);
+    const auto compared = [&](const std::string& file) {
+        return run("--zone Europe/Berlin --allow zone --allow 'a date for a time' " + file + " " +
+                       examples,
+                   "", "compare_ics");
+    };
+    const Outcome same = compared("all.ics");
+    EXPECT_EQ(same.status, 0) << same.out << same.err;
+    EXPECT_NE(same.out.find("53 compared"), std::string::npos) << same.out;
+    const struct {
+        const char* from;
+        const char* to;
+        const char* kind;
+    } changes[] = {
+        {"SUMMARY:Choir\r", "SUMMARY:Quire\r", "SUMMARY"},
+        {"TRIGGER:-PT30M", "TRIGGER:-PT31M", "VALARM"},
+        {"T193000", "T194500", "DTSTART"},
+        {"EXDATE;TZID=Europe/Berlin:20260217T", "EXDATE;TZID=Europe/Berlin:20260216T",
+         "occurrences"},
+        {"BYDAY=TU", "BYDAY=WE", "occurrences"},
+        {"LOCATION:Parish hall", "COMMENT:Parish hall", "LOCATION"},
+    };
+    const std::string text = file_text(folder_ / "all.ics");
+    for (const auto& change : changes) {
+        SCOPED_TRACE(change.to);
+        const std::size_t at = text.find(change.from);
+        ASSERT_NE(at, std::string::npos);
+        std::ofstream(folder_ / "changed.ics")
+            << text.substr(0, at) << change.to
+            << text.substr(at + std::string_view(change.from).size());
+        const Outcome differs = compared("changed.ics");
+        EXPECT_EQ(differs.status, 1);
+        EXPECT_NE(differs.out.find(fmt::format(" {}\n", change.kind)), std::string::npos)
+            << differs.out;
+    }
 }
 
 TEST_F(QorCloudTest, TwoImportsAtOnceBothArrive) {
