@@ -243,6 +243,7 @@ TEST(JsonParseBuffer, ATextNestedDeeperThan256LevelsIsNotJson) {
         {"after an escape of no digit", R"(["\ug000",")" + deep, false},
         {"after an escape of one digit", R"(["\u0g00",")" + deep, false},
         {"after an escape of two digits", R"(["\u00g0",")" + deep, false},
+        {"after an escape of three digits", R"(["\u000g",")" + deep, false},
         {"after a short second half", R"(["\ud83d\ude",")" + deep, false},
         {"after a quote in a comment", R"(/*"*/)" + deep, false},
         {"after a quote in single quotes", R"(['"',)" + deep, false},
