@@ -81,8 +81,9 @@ bool has_offsets(const std::string& zone, int year, const std::vector<int>& expe
         for (const int day : {1, 16}) {
             const std::int64_t instant =
                 utc_instant({year + month / 12, month % 12 + 1, day, 12, 0, 0});
+            const int wanted = expected[at++];
             const auto wall = wall_time(instant, zone);
-            if ((!wall || utc_instant(*wall) - instant != expected[at++]) && exceptions-- == 0) {
+            if ((!wall || utc_instant(*wall) - instant != wanted) && exceptions-- == 0) {
                 return false;
             }
         }
