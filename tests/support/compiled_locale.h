@@ -15,9 +15,11 @@
 class CompiledLocale {
   public:
     CompiledLocale(const std::string& name, const std::string& directory) {
-        const std::string compile = "localedef -i " + name + " -f UTF-8 '" + directory + "/" + name;
-        if (!std::filesystem::exists(directory + "/" + name)) {
-            EXPECT_EQ(std::system((compile + "' 2>/dev/null").c_str()), 0) << compile;
+        const std::string compiled = directory + "/" + name;
+        if (!std::filesystem::exists(compiled)) {
+            const std::string compile =
+                "localedef -i " + name + " -f UTF-8 '" + compiled + "' 2>/dev/null";
+            EXPECT_EQ(std::system(compile.c_str()), 0) << compile;
         }
         setenv("LOCPATH", directory.c_str(), 1);
         EXPECT_NE(std::setlocale(LC_ALL, name.c_str()), nullptr) << name;
