@@ -240,6 +240,21 @@ qor::CloudStore open_cloud(const std::string& path, const std::string& who) {
     return qor::need(qor::CloudStore::open(path, options));
 }
 
+void each_event(const std::function<void(calendar_record_h)>& work) {
+    calendar_query_h query = nullptr;
+    calendar_list_h list = nullptr;
+    check(calendar_query_create(_calendar_event._uri, &query), "query");
+    check(calendar_db_get_records_with_query(query, 0, 0, &list), "events");
+    calendar_record_h event = nullptr;
+    for (int rc = calendar_list_first(list); rc == CALENDAR_ERROR_NONE;
+         rc = calendar_list_next(list)) {
+        check(calendar_list_get_current_record_p(list, &event), "event");
+        work(event);
+    }
+    check(calendar_list_destroy(list, true), "list");
+    check(calendar_query_destroy(query), "query");
+}
+
 }  // namespace
 
 TestDevice::TestDevice(fs::path directory, std::string cloud_path)
@@ -385,20 +400,11 @@ void TestDevice::remove(int event) {
 int TestDevice::find(const std::string& title) {
     int found = 0;
     visit([&] {
-        calendar_query_h query = nullptr;
-        calendar_list_h list = nullptr;
-        check(calendar_query_create(_calendar_event._uri, &query), "query");
-        check(calendar_db_get_records_with_query(query, 0, 0, &list), "events");
-        calendar_record_h record = nullptr;
-        for (int rc = calendar_list_first(list); rc == CALENDAR_ERROR_NONE;
-             rc = calendar_list_next(list)) {
-            check(calendar_list_get_current_record_p(list, &record), "event");
-            if (text(record, _calendar_event.summary) == title) {
-                found = number(record, _calendar_event.id);
+        each_event([&](calendar_record_h event) {
+            if (text(event, _calendar_event.summary) == title) {
+                found = number(event, _calendar_event.id);
             }
-        }
-        check(calendar_list_destroy(list, true), "list");
-        check(calendar_query_destroy(query), "query");
+        });
     });
     return found;
 }
@@ -413,20 +419,7 @@ void TestDevice::wipe_calendar() {
 
 std::vector<std::string> TestDevice::contents() {
     std::vector<std::string> lines;
-    visit([&] {
-        calendar_query_h query = nullptr;
-        calendar_list_h list = nullptr;
-        check(calendar_query_create(_calendar_event._uri, &query), "query");
-        check(calendar_db_get_records_with_query(query, 0, 0, &list), "events");
-        calendar_record_h record = nullptr;
-        for (int rc = calendar_list_first(list); rc == CALENDAR_ERROR_NONE;
-             rc = calendar_list_next(list)) {
-            check(calendar_list_get_current_record_p(list, &record), "event");
-            lines.push_back(describe(record));
-        }
-        check(calendar_list_destroy(list, true), "list");
-        check(calendar_query_destroy(query), "query");
-    });
+    visit([&] { each_event([&](calendar_record_h event) { lines.push_back(describe(event)); }); });
     std::sort(lines.begin(), lines.end());
     return lines;
 }

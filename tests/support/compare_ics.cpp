@@ -273,17 +273,12 @@ std::string utf8(std::string text) {
     if (g_utf8_validate(text.data(), static_cast<gssize>(text.size()), nullptr) != 0) {
         return text;
     }
-    std::string result;
-    for (const char c : text) {
-        const auto byte = static_cast<unsigned char>(c);
-        if (byte < 0x80) {
-            result += c;
-        } else {
-            result += static_cast<char>(0xc0 | (byte >> 6));
-            result += static_cast<char>(0x80 | (byte & 0x3f));
-        }
-    }
-    return result;
+    gsize length = 0;
+    const std::unique_ptr<char, decltype(&g_free)> converted(
+        g_convert(text.data(), static_cast<gssize>(text.size()), "UTF-8", "ISO-8859-1", nullptr,
+                  &length, nullptr),
+        g_free);
+    return converted ? std::string(converted.get(), length) : text;
 }
 
 // An occurrence is named by its second, or by its date where one of the two is a date.
